@@ -1,0 +1,30 @@
+# Thin wrapper over tools/install-deps.sh, CMake and CTest.
+BUILD_DIR ?= build
+JOBS ?= $(shell nproc)
+MAKEFLAGS += --no-print-directory
+CMAKE_FLAGS ?= -DCMAKE_BUILD_TYPE=RelWithDebInfo -DSORVEL_WERROR=ON
+
+.PHONY: all deps configure build test demo bench clean
+
+all: build
+
+deps:
+	@bash tools/install-deps.sh
+
+configure: deps
+	@cmake -S . -B $(BUILD_DIR) $(CMAKE_FLAGS) >/dev/null
+
+build: configure
+	@cmake --build $(BUILD_DIR) -j $(JOBS)
+
+test: build
+	@cd $(BUILD_DIR) && ctest --output-on-failure -j $(JOBS)
+
+demo: build
+	@$(BUILD_DIR)/tools/sorvel --help
+
+bench: build
+	@$(BUILD_DIR)/bench/sorvel_benchmarks
+
+clean:
+	@rm -rf $(BUILD_DIR)

@@ -1,0 +1,77 @@
+// A cascade of `order` identical one-pole low-pass stages (a gamma filter):
+// for each stage k, state[k] += (1 - pole) * (in_k - state[k]), where in_0 is
+// the input and in_k the freshly updated state[k - 1]; the output is the last
+// state. Its impulse response is a discrete gamma kernel, a smooth bump whose
+// spread and delay follow from `order` and `pole` (see
+// GammaFilterPoleFromStddev and GammaFilterDelay).
+//
+// Not thread safe (holds state). Construction with a non-positive sample rate
+// or an order below 1 ends the process through CHECK.
+#ifndef AUDIO_DSP_GAMMA_FILTER_H_
+#define AUDIO_DSP_GAMMA_FILTER_H_
+
+#include <cmath>
+#include <vector>
+
+#include "base/logging.h"
+
+namespace audio_dsp {
+
+class GammaFilter {
+ public:
+  // `sample_rate` in Hz (> 0), `order` >= 1 stages, `pole` in [0, 1).
+  GammaFilter(int order, double sample_rate, double pole)
+      : sample_rate_(sample_rate),
+        order_(order),
+        pole_(pole),
+        gain_(static_cast<float>(1.0 - pole)),
+        states_(order > 0 ? order : 0, 0.0f) {
+    CHECK(sample_rate > 0.0);
+    CHECK(order >= 1);
+  }
+
+  // Filters one sample and returns the output of the last stage.
+  float ProcessSample(float x) {
+    float in = x;
+    for (float& state : states_) {
+      state += gain_ * (in - state);
+      in = state;
+    }
+    return in;
+  }
+
+  // Zeroes every stage.
+  void Reset() { states_.assign(states_.size(), 0.0f); }
+
+  double sample_rate() const { return sample_rate_; }
+  int order() const { return order_; }
+  double pole() const { return pole_; }
+  float gain() const { return gain_; }
+
+ private:
+  double sample_rate_;
+  int order_;
+  double pole_;
+  float gain_;
+  std::vector<float> states_;
+};
+
+// The pole that gives an `order`-stage gamma filter an impulse response with
+// standard deviation `stddev_samples`: with v = stddev^2 / order,
+// pole = (1 - sqrt(4 v + 1)) / (2 v) + 1. Requires stddev > 0 and order >= 1.
+inline double GammaFilterPoleFromStddev(double stddev_samples, int order) {
+  CHECK(stddev_samples > 0.0);
+  CHECK(order >= 1);
+  const double v = stddev_samples * stddev_samples / order;
+  return (1.0 - std::sqrt(4.0 * v + 1.0)) / (2.0 * v) + 1.0;
+}
+
+// The filter's delay in samples (the mean of its impulse response, rounded):
+// round(order * pole / (1 - pole)).
+inline int GammaFilterDelay(int order, double pole) {
+  return static_cast<int>(std::lround(order * pole / (1.0 - pole)));
+}
+
+}  // namespace audio_dsp
+
+#endif  // AUDIO_DSP_GAMMA_FILTER_H_

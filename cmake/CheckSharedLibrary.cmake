@@ -1,0 +1,45 @@
+# cmake -DLIBRARY=<path> -P CheckSharedLibrary.cmake
+# Fails unless every exported symbol of LIBRARY is a JNI entry point of
+# com.tessal.android.orv.audiomodem and every LOAD segment is 16 KB aligned.
+find_program(NM nm REQUIRED)
+find_program(READELF readelf REQUIRED)
+
+execute_process(COMMAND ${NM} -D --defined-only ${LIBRARY}
+                OUTPUT_VARIABLE symbols RESULT_VARIABLE rc)
+if(NOT rc EQUAL 0)
+  message(FATAL_ERROR "nm failed on ${LIBRARY}")
+endif()
+string(REPLACE "\n" ";" lines "${symbols}")
+set(bad "")
+foreach(line IN LISTS lines)
+  if(line MATCHES "^[0-9a-fA-F]* +[A-Za-z] +(.+)$")
+    set(name "${CMAKE_MATCH_1}")
+    if(NOT name MATCHES "^Java_com_tessal_android_orv_audiomodem_"
+       AND NOT name MATCHES "^SORVEL_[0-9.]+$")
+      list(APPEND bad "${name}")
+    endif()
+  endif()
+endforeach()
+if(bad)
+  message(FATAL_ERROR "unexpected exported symbols: ${bad}")
+endif()
+
+execute_process(COMMAND ${READELF} -lW ${LIBRARY}
+                OUTPUT_VARIABLE segments RESULT_VARIABLE rc)
+if(NOT rc EQUAL 0)
+  message(FATAL_ERROR "readelf failed on ${LIBRARY}")
+endif()
+string(REPLACE "\n" ";" lines "${segments}")
+set(loads 0)
+foreach(line IN LISTS lines)
+  if(line MATCHES "^ *LOAD ")
+    math(EXPR loads "${loads} + 1")
+    if(NOT line MATCHES " 0x4000$")
+      message(FATAL_ERROR "LOAD segment not 16 KB aligned: ${line}")
+    endif()
+  endif()
+endforeach()
+if(loads EQUAL 0)
+  message(FATAL_ERROR "no LOAD segments in ${LIBRARY}")
+endif()
+message(STATUS "${LIBRARY}: exports and 16 KB alignment ok (${loads} LOAD segments)")

@@ -1,0 +1,63 @@
+# Third-party libraries of the modem. On the host they come from Debian
+# packages (tools/install-deps.sh); Android has no such packages, so pinned
+# releases are fetched there instead. The Android branch cannot be exercised
+# on the development machines (no NDK, no network beyond Debian); add a
+# URL_HASH for each archive when it is first built for real.
+
+if(ANDROID)
+  include(FetchContent)
+  # KISS FFT, float, static, without its tests and tools.
+  set(KISSFFT_DATATYPE float CACHE STRING "" FORCE)
+  set(KISSFFT_STATIC ON CACHE BOOL "" FORCE)
+  set(KISSFFT_TEST OFF CACHE BOOL "" FORCE)
+  set(KISSFFT_TOOLS OFF CACHE BOOL "" FORCE)
+  set(KISSFFT_PKGCONFIG OFF CACHE BOOL "" FORCE)
+  set(KISSFFT_OPENMP OFF CACHE BOOL "" FORCE)
+  FetchContent_Declare(kissfft
+    URL https://github.com/mborgerding/kissfft/archive/refs/tags/131.1.0.tar.gz)
+  FetchContent_MakeAvailable(kissfft)
+  if(NOT TARGET kissfft::kissfft)
+    add_library(kissfft::kissfft ALIAS kissfft)
+  endif()
+  # Eigen is header-only: unpack it and point an interface target at it.
+  FetchContent_Declare(eigen
+    URL https://gitlab.com/libeigen/eigen/-/archive/3.4.0/eigen-3.4.0.tar.gz)
+  FetchContent_GetProperties(eigen)
+  if(NOT eigen_POPULATED)
+    FetchContent_Populate(eigen)
+  endif()
+  add_library(sorvel_eigen INTERFACE)
+  target_include_directories(sorvel_eigen SYSTEM INTERFACE ${eigen_SOURCE_DIR})
+  add_library(Eigen3::Eigen ALIAS sorvel_eigen)
+  find_library(SORVEL_ANDROID_LOG_LIBRARY log REQUIRED)
+else()
+  find_package(kissfft CONFIG REQUIRED COMPONENTS SHARED float)
+  find_package(Eigen3 3.4 CONFIG REQUIRED)
+
+  # The Android log library built for the host (android-liblog-dev), to
+  # compile and test the Android log sink here.
+  find_path(SORVEL_HOST_LIBLOG_INCLUDE_DIR android/log.h PATH_SUFFIXES android)
+  find_library(SORVEL_HOST_LIBLOG_LIBRARY log PATH_SUFFIXES android)
+  if(SORVEL_HOST_LIBLOG_INCLUDE_DIR AND SORVEL_HOST_LIBLOG_LIBRARY)
+    set(SORVEL_HOST_ANDROID_LOG_DEFAULT ON)
+  else()
+    set(SORVEL_HOST_ANDROID_LOG_DEFAULT OFF)
+  endif()
+  option(SORVEL_HOST_ANDROID_LOG
+         "Build and test the Android log sink against the host liblog"
+         ${SORVEL_HOST_ANDROID_LOG_DEFAULT})
+
+  # JNI headers for the peers and Java for the peer classes and their tests.
+  # CMake 3.25 does not find OpenJDK 17 by itself: derive JAVA_HOME from
+  # javac (JAVA_HOME/bin/javac) when it is not set.
+  if(NOT DEFINED ENV{JAVA_HOME} AND NOT JAVA_HOME)
+    find_program(SORVEL_JAVAC javac)
+    if(SORVEL_JAVAC)
+      file(REAL_PATH "${SORVEL_JAVAC}" _sorvel_javac_real)
+      get_filename_component(_sorvel_java_bin "${_sorvel_javac_real}" DIRECTORY)
+      get_filename_component(JAVA_HOME "${_sorvel_java_bin}" DIRECTORY)
+      set(JAVA_HOME "${JAVA_HOME}" CACHE PATH "JDK used for JNI and Java")
+    endif()
+  endif()
+  find_package(JNI REQUIRED)
+endif()

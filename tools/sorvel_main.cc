@@ -1,0 +1,24 @@
+// sorvel: encode tokens to WAV and decode them from files or live PCM.
+#include <cstdlib>
+#include <iostream>
+
+#include "CLI/CLI.hpp"
+#include "base/logging.h"
+
+int main(int argc, char** argv) {
+  CLI::App app{
+      "Sorvel acoustic data modem: short tokens over near-ultrasonic sound."};
+  app.set_version_flag("--version", "sorvel 0.1.0");
+  int verbosity = 0;
+  app.add_option("-v,--verbosity", verbosity,
+                 "Log level for detailed library messages (0 = off)")
+      ->check(CLI::NonNegativeNumber);
+  app.require_subcommand(0, 1);
+  app.callback([&] { sorvel_base::SetVlogLevel(verbosity); });
+
+  CLI11_PARSE(app, argc, argv);
+  if (app.get_subcommands().empty()) {
+    std::cout << app.help();
+  }
+  return EXIT_SUCCESS;
+}
