@@ -20,6 +20,8 @@
 #include <sstream>
 #include <string>
 #include <string_view>
+#include <type_traits>
+#include <utility>
 
 namespace sorvel_base {
 
@@ -93,19 +95,32 @@ std::string* MakeCheckOpString(const A& a, const B& b, const char* text) {
   return new std::string(out.str());
 }
 
-#define SORVEL_DEFINE_CHECK_OP(name, op)                                    \
+// Integers of mixed signedness compare by value (std::cmp_*), so that
+// CHECK_EQ(v.size(), n) needs no cast and cannot wrap.
+template <typename T>
+inline constexpr bool kCompareAsInteger =
+    std::is_integral_v<T> && !std::is_same_v<T, bool> &&
+    !std::is_same_v<T, char>;
+
+#define SORVEL_DEFINE_CHECK_OP(name, op, integer_compare)                   \
   template <typename A, typename B>                                         \
   inline std::string* Check##name##Impl(const A& a, const B& b,             \
                                         const char* text) {                 \
-    if (a op b) [[likely]] return nullptr;                                  \
+    bool ok;                                                                \
+    if constexpr (kCompareAsInteger<A> && kCompareAsInteger<B>) {           \
+      ok = integer_compare(a, b);                                           \
+    } else {                                                                \
+      ok = a op b;                                                          \
+    }                                                                       \
+    if (ok) [[likely]] return nullptr;                                      \
     return MakeCheckOpString(a, b, text);                                   \
   }
-SORVEL_DEFINE_CHECK_OP(EQ, ==)
-SORVEL_DEFINE_CHECK_OP(NE, !=)
-SORVEL_DEFINE_CHECK_OP(LT, <)
-SORVEL_DEFINE_CHECK_OP(LE, <=)
-SORVEL_DEFINE_CHECK_OP(GT, >)
-SORVEL_DEFINE_CHECK_OP(GE, >=)
+SORVEL_DEFINE_CHECK_OP(EQ, ==, std::cmp_equal)
+SORVEL_DEFINE_CHECK_OP(NE, !=, std::cmp_not_equal)
+SORVEL_DEFINE_CHECK_OP(LT, <, std::cmp_less)
+SORVEL_DEFINE_CHECK_OP(LE, <=, std::cmp_less_equal)
+SORVEL_DEFINE_CHECK_OP(GT, >, std::cmp_greater)
+SORVEL_DEFINE_CHECK_OP(GE, >=, std::cmp_greater_equal)
 #undef SORVEL_DEFINE_CHECK_OP
 
 // Owns the text of a failed CHECK_op until the fatal line is written.

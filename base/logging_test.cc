@@ -58,6 +58,7 @@ TEST(LoggingTest, PassingChecksAreSilent) {
   CHECK(next() == 1) << "not evaluated " << next();
   CHECK_EQ(next(), 2);
   CHECK_LT(next(), 4);
+  CHECK_EQ(std::string("abc").size(), 3);  // size_t against int
   if (calls == 3)
     CHECK_GE(calls, 3);
   else
@@ -84,6 +85,9 @@ TEST(LoggingDeathTest, FailedChecksAbortWithExpressionText) {
   EXPECT_DEATH(CHECK(two < 0), "base/logging_test.cc:[0-9]+\\] Check failed");
   EXPECT_DEATH(CHECK_EQ(two, 3) << "context", "two == 3 \\(2 vs. 3\\) context");
   EXPECT_DEATH(CHECK_GT(two, 2), CheckFailed("two > 2"));
+  // Mixed signedness compares values: -1 is not equal to SIZE_MAX.
+  const size_t big = static_cast<size_t>(-1);
+  EXPECT_DEATH(CHECK_EQ(big, -1), CheckFailed("big == -1"));
   EXPECT_DEATH(LOG(FATAL) << "fatal text", "fatal text");
   EXPECT_DEATH(
       {

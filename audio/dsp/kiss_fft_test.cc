@@ -1,0 +1,193 @@
+#include "audio/dsp/kiss_fft.h"
+
+#include <cmath>
+#include <complex>
+#include <numbers>
+#include <random>
+#include <vector>
+
+#include "gtest/gtest.h"
+#include "tests/test_helpers.h"
+
+namespace audio_dsp {
+namespace {
+
+using Complex = std::complex<float>;
+using sorvel_test::CheckFailed;
+
+// The DFT in double precision, exponent sign -1 (forward) or +1 (inverse),
+// with an exact twiddle table indexed by k * n mod N.
+std::vector<std::complex<double>> DirectDft(const std::vector<Complex>& x,
+                                            int sign) {
+  const int n = static_cast<int>(x.size());
+  std::vector<std::complex<double>> twiddle(n);
+  for (int i = 0; i < n; ++i) {
+    twiddle[i] = std::polar(1.0, sign * 2.0 * std::numbers::pi * i / n);
+  }
+  std::vector<std::complex<double>> y(n);
+  for (int k = 0; k < n; ++k) {
+    std::complex<double> sum;
+    for (int j = 0; j < n; ++j) {
+      sum += std::complex<double>(x[j]) *
+             twiddle[(static_cast<int64_t>(k) * j) % n];
+    }
+    y[k] = sum;
+  }
+  return y;
+}
+
+// ||actual - expected|| / ||expected|| over the first `count` values.
+template <typename A>
+double RelativeError(const std::vector<A>& actual,
+                     const std::vector<std::complex<double>>& expected,
+                     size_t count) {
+  double error = 0.0, norm = 0.0;
+  for (size_t i = 0; i < count; ++i) {
+    error += std::norm(std::complex<double>(actual[i]) - expected[i]);
+    norm += std::norm(expected[i]);
+  }
+  return std::sqrt(error / norm);
+}
+
+std::vector<Complex> RandomComplex(int n, int seed) {
+  std::mt19937 rng(seed);
+  std::normal_distribution<float> normal;
+  std::vector<Complex> x(n);
+  for (Complex& v : x) v = {normal(rng), normal(rng)};
+  return x;
+}
+
+TEST(IsFastFFTSizeTest, FactorsOfTwoThreeFiveTimesSmallRemainder) {
+  for (int size : {1, 2, 26, 2 * 3 * 5 * 23, 63, 255, 1024, 2208, 3840}) {
+    EXPECT_TRUE(IsFastFFTSize(size)) << size;
+  }
+  for (int size : {29, 62, 49, 31, 127, 511, 635, 1023, 1905, 2047, 34290}) {
+    EXPECT_FALSE(IsFastFFTSize(size)) << size;
+  }
+}
+
+// Verifies which back end each facade picks.
+TEST(FFTTransformerTest, ChoosesBackendBySize) {
+  const auto is_kiss = [](const ComplexFFTTransformer& t) {
+    return dynamic_cast<const KissComplexFFTTransformerImpl*>(&t.impl()) != nullptr;
+  };
+  const auto is_bluestein = [](const ComplexFFTTransformer& t) {
+    return dynamic_cast<const BluesteinComplexFFTTransformerImpl*>(&t.impl()) !=
+           nullptr;
+  };
+  EXPECT_TRUE(is_kiss(ComplexFFTTransformer(1024, false)));
+  EXPECT_TRUE(is_kiss(ComplexFFTTransformer(63, false)));
+  EXPECT_TRUE(is_bluestein(ComplexFFTTransformer(127, false)));
+  EXPECT_TRUE(is_bluestein(ComplexFFTTransformer(1905, false)));
+  const auto is_kiss_real = [](int size) {
+    const RealFFTTransformer t(size, false);
+    return dynamic_cast<const KissRealFFTTransformerImpl*>(&t.impl()) != nullptr;
+  };
+  EXPECT_TRUE(is_kiss_real(64));
+  EXPECT_TRUE(is_kiss_real(2208));
+  EXPECT_FALSE(is_kiss_real(63));   // odd: complex KISS back end
+  EXPECT_FALSE(is_kiss_real(254));  // not fast: Bluestein back end
+  EXPECT_EQ(BluesteinComplexFFTTransformerImpl(1905).GetInnerSize(), 3840);
+}
+
+class FFTAccuracyTest : public testing::TestWithParam<int> {};
+
+// Verifies the complex forward and inverse transforms and the real forward
+// transform against the double-precision DFT, and that the normalised
+// inverses restore the input.
+TEST_P(FFTAccuracyTest, MatchesDirectDft) {
+  const int n = GetParam();
+  const double tolerance = IsFastFFTSize(n) ? 1e-5 : 1e-4;
+  const std::vector<Complex> x = RandomComplex(n, n);
+
+  ComplexFFTTransformer complex_fft(n, /*normalize_inverse=*/false);
+  std::vector<Complex> y;
+  complex_fft.Forward(x, &y);
+  EXPECT_LT(RelativeError(y, DirectDft(x, -1), n), tolerance);
+  complex_fft.Inverse(x, &y);
+  EXPECT_LT(RelativeError(y, DirectDft(x, +1), n), tolerance);
+
+  ComplexFFTTransformer normalized(n, /*normalize_inverse=*/true);
+  std::vector<Complex> round_trip;
+  normalized.Forward(x, &y);
+  normalized.Inverse(y, &round_trip);
+  std::vector<std::complex<double>> expected_x(x.begin(), x.end());
+  EXPECT_LT(RelativeError(round_trip, expected_x, n), tolerance);
+
+  std::vector<float> real(n);
+  std::vector<Complex> real_as_complex(n);
+  for (int i = 0; i < n; ++i) {
+    real[i] = x[i].real();
+    real_as_complex[i] = {x[i].real(), 0.0f};
+  }
+  RealFFTTransformer real_fft(n, /*normalize_inverse=*/true);
+  ASSERT_EQ(real_fft.GetTransformedSize(), n / 2 + 1);
+  std::vector<Complex> spectrum;
+  real_fft.Forward(real, &spectrum);
+  ASSERT_EQ(spectrum.size(), static_cast<size_t>(n / 2 + 1));
+  EXPECT_LT(RelativeError(spectrum, DirectDft(real_as_complex, -1), n / 2 + 1),
+            tolerance);
+  std::vector<float> real_round_trip;
+  real_fft.Inverse(spectrum, &real_round_trip);
+  ASSERT_EQ(real_round_trip.size(), static_cast<size_t>(n));
+  std::vector<std::complex<double>> expected_real(real.begin(), real.end());
+  EXPECT_LT(RelativeError(real_round_trip, expected_real, n), tolerance);
+}
+
+INSTANTIATE_TEST_SUITE_P(SmallSizes, FFTAccuracyTest, testing::Range(1, 65));
+INSTANTIATE_TEST_SUITE_P(ModemSizes, FFTAccuracyTest,
+                         testing::Values(127, 635, 1905, 2047, 2208));
+INSTANTIATE_TEST_SUITE_P(LargeNonFastSizes, FFTAccuracyTest,
+                         testing::Values(4099, 6002, 10007));
+
+// A whole default token (34290 = 2 * 3^3 * 5 * 127 samples) is too long for
+// the direct DFT; the round trip and a pure tone still pin it down.
+TEST(FFTTransformerTest, LongNonFastRealTransform) {
+  const int n = 34290;
+  RealFFTTransformer fft(n, /*normalize_inverse=*/true);
+  std::vector<float> x(n);
+  const int bin = 4321;
+  for (int i = 0; i < n; ++i) {
+    x[i] = static_cast<float>(
+        std::cos(2.0 * std::numbers::pi * bin * static_cast<double>(i) / n));
+  }
+  std::vector<Complex> spectrum;
+  fft.Forward(x, &spectrum);
+  for (int k = 0; k < static_cast<int>(spectrum.size()); ++k) {
+    const double expected = k == bin ? n / 2.0 : 0.0;
+    ASSERT_NEAR(std::abs(spectrum[k]), expected, 1e-4 * n) << "bin " << k;
+  }
+  std::vector<float> y;
+  fft.Inverse(spectrum, &y);
+  double error = 0.0, norm = 0.0;
+  for (int i = 0; i < n; ++i) {
+    error += (y[i] - x[i]) * (y[i] - x[i]);
+    norm += x[i] * x[i];
+  }
+  EXPECT_LT(std::sqrt(error / norm), 1e-4);
+}
+
+#if GTEST_HAS_DEATH_TEST
+TEST(FFTTransformerDeathTest, RejectsWrongSizesAndNullPointers) {
+  EXPECT_DEATH(ComplexFFTTransformer(0, false), CheckFailed("size > 0"));
+  EXPECT_DEATH(RealFFTTransformer(-4, false), CheckFailed("size > 0"));
+  ComplexFFTTransformer complex_fft(8, false);
+  std::vector<Complex> out;
+  EXPECT_DEATH(complex_fft.Forward(std::vector<Complex>(7), &out),
+               CheckFailed("input.size() == GetSize()"));
+  EXPECT_DEATH(complex_fft.Inverse(std::vector<Complex>(9), &out),
+               CheckFailed("input.size() == GetSize()"));
+  Complex buffer[8];
+  EXPECT_DEATH(complex_fft.Forward(nullptr, buffer), CheckFailed("input"));
+  EXPECT_DEATH(complex_fft.Inverse(buffer, nullptr), CheckFailed("output"));
+  RealFFTTransformer real_fft(8, false);
+  std::vector<float> real_out;
+  EXPECT_DEATH(real_fft.Forward(std::vector<float>(5), &out),
+               CheckFailed("input.size() == GetSize()"));
+  EXPECT_DEATH(real_fft.Inverse(std::vector<Complex>(8), &real_out),
+               CheckFailed("input.size() == GetTransformedSize()"));
+}
+#endif
+
+}  // namespace
+}  // namespace audio_dsp

@@ -1,0 +1,118 @@
+#include "audio/dsp/rational_factor_resampler.h"
+
+#include <cmath>
+#include <cstdint>
+
+#include "audio/dsp/number_util.h"
+
+namespace audio_dsp {
+namespace {
+
+// One output: the dot product of `num_taps` real taps with the samples at
+// `s`. Four partial sums break the dependency chain of a single accumulator
+// (the compiler may not reassociate float additions by itself).
+inline float Dot(const float* taps, const float* s, int num_taps) {
+  float sum[4] = {0.0f, 0.0f, 0.0f, 0.0f};
+  int m = 0;
+  for (; m + 4 <= num_taps; m += 4) {
+    for (int j = 0; j < 4; ++j) sum[j] += taps[m + j] * s[m + j];
+  }
+  for (; m < num_taps; ++m) sum[0] += taps[m] * s[m];
+  return (sum[0] + sum[1]) + (sum[2] + sum[3]);
+}
+
+inline std::complex<float> Dot(const float* taps, const std::complex<float>* s,
+                               int num_taps) {
+  // Interleaved re/im pairs; two partial sums per part.
+  const float* x = reinterpret_cast<const float*>(s);
+  float re[2] = {0.0f, 0.0f};
+  float im[2] = {0.0f, 0.0f};
+  int m = 0;
+  for (; m + 2 <= num_taps; m += 2) {
+    for (int j = 0; j < 2; ++j) {
+      re[j] += taps[m + j] * x[2 * (m + j)];
+      im[j] += taps[m + j] * x[2 * (m + j) + 1];
+    }
+  }
+  for (; m < num_taps; ++m) {
+    re[0] += taps[m] * x[2 * m];
+    im[0] += taps[m] * x[2 * m + 1];
+  }
+  return {re[0] + re[1], im[0] + im[1]};
+}
+
+}  // namespace
+
+template <typename T>
+RationalFactorResampler<T>::RationalFactorResampler(
+    const ResamplingKernel& kernel, int max_denominator) {
+  if (!kernel.Valid() || max_denominator < 1) return;
+  const Rational ratio = RationalApproximation(
+      max_denominator, kernel.input_sample_rate() / kernel.output_sample_rate());
+  if (ratio.numerator < 1) return;  // output rate beyond 2^31 times the input
+  factor_numerator_ = ratio.numerator;
+  factor_denominator_ = ratio.denominator;
+  integer_step_ = factor_numerator_ / factor_denominator_;
+  fractional_step_ = factor_numerator_ % factor_denominator_;
+  radius_ = static_cast<int>(std::ceil(kernel.radius()));
+  num_taps_ = 2 * radius_ + 1;
+  filters_.assign(factor_denominator_, std::vector<float>(num_taps_));
+  for (int p = 0; p < factor_denominator_; ++p) {
+    const double offset = static_cast<double>(p) / factor_denominator_;
+    for (int j = -radius_; j <= radius_; ++j) {
+      filters_[p][radius_ - j] = static_cast<float>(kernel.Eval(j + offset));
+    }
+  }
+  valid_ = true;
+  Reset();
+}
+
+template <typename T>
+void RationalFactorResampler<T>::Reset() {
+  phase_ = 0;
+  delayed_input_.assign(radius_, T{});
+}
+
+template <typename T>
+void RationalFactorResampler<T>::ProcessSamples(std::span<const T> input,
+                                                std::vector<T>* output) {
+  // The working stream is delayed_input_ followed by the input; appending in
+  // place keeps one buffer whose capacity settles after the first blocks.
+  delayed_input_.insert(delayed_input_.end(), input.begin(), input.end());
+  const int64_t total = static_cast<int64_t>(delayed_input_.size());
+  const int64_t starts = total + 1 - num_taps_;  // window starts available
+  if (starts < 1) {
+    output->clear();
+    return;
+  }
+  const int64_t count =
+      (starts * factor_denominator_ - phase_ - 1 + factor_numerator_) /
+      factor_numerator_;
+  output->resize(count);
+
+  const T* s = delayed_input_.data();
+  int64_t i = 0;
+  for (int64_t k = 0; k < count; ++k) {
+    (*output)[k] = Dot(filters_[phase_].data(), s + i, num_taps_);
+    phase_ += fractional_step_;
+    i += integer_step_;
+    if (phase_ >= factor_denominator_) {
+      phase_ -= factor_denominator_;
+      ++i;
+    }
+  }
+  delayed_input_.erase(delayed_input_.begin(),
+                       delayed_input_.begin() + std::min(i, total));
+}
+
+template <typename T>
+void RationalFactorResampler<T>::Flush(std::vector<T>* output) {
+  output->clear();
+  const std::vector<T> zeros(num_taps_ - 1, T{});
+  ProcessSamples(zeros, output);
+}
+
+template class RationalFactorResampler<float>;
+template class RationalFactorResampler<std::complex<float>>;
+
+}  // namespace audio_dsp
