@@ -1,10 +1,10 @@
-// 16-bit PCM at the Java boundary.
+// 16-bit PCM, as Java and WAV files receive it.
 //
-// Encoder output is float at full scale +-1.0; Java receives signed 16-bit
+// Encoder output is float at full scale +-1.0; the app receives signed 16-bit
 // little-endian mono PCM. A sample s becomes trunc(s * 32768) limited to
 // [-32768, 32767], so 1.0 -> 32767, -1.0 -> -32768, -0.5 -> -16384.
-#ifndef AUDIO_JNI_PCM16_H_
-#define AUDIO_JNI_PCM16_H_
+#ifndef AUDIO_PCM16_H_
+#define AUDIO_PCM16_H_
 
 #include <cstdint>
 #include <span>
@@ -20,4 +20,4 @@ std::vector<int8_t> FloatsToPcm16Le(std::span<const float> samples);
 
 }  // namespace audio_sorvane
 
-#endif  // AUDIO_JNI_PCM16_H_
+#endif  // AUDIO_PCM16_H_

@@ -1,4 +1,4 @@
-#include "audio/jni/pcm16.h"
+#include "audio/pcm16.h"
 
 #include <algorithm>
 #include <cmath>

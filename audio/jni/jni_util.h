@@ -1,0 +1,38 @@
+// Small RAII and conversion helpers shared by the JNI peers.
+#ifndef AUDIO_JNI_JNI_UTIL_H_
+#define AUDIO_JNI_JNI_UTIL_H_
+
+#include <jni.h>
+
+#include <span>
+
+namespace audio_sorvane {
+
+// Deletes a local reference when it goes out of scope, so that loops and
+// long native calls do not pile up references.
+template <typename T>
+class ScopedLocalRef {
+ public:
+  ScopedLocalRef(JNIEnv* env, T ref) : env_(env), ref_(ref) {}
+  ~ScopedLocalRef() {
+    if (ref_ != nullptr) env_->DeleteLocalRef(ref_);
+  }
+  ScopedLocalRef(const ScopedLocalRef&) = delete;
+  ScopedLocalRef& operator=(const ScopedLocalRef&) = delete;
+
+  T get() const { return ref_; }
+  explicit operator bool() const { return ref_ != nullptr; }
+
+ private:
+  JNIEnv* env_;
+  T ref_;
+};
+
+// A new Java byte[] holding `samples` as 16-bit little-endian PCM (empty
+// samples give an empty array); null when allocation fails or an exception
+// is pending afterwards.
+jbyteArray FloatsToPcmByteArray(JNIEnv* env, std::span<const float> samples);
+
+}  // namespace audio_sorvane
+
+#endif  // AUDIO_JNI_JNI_UTIL_H_

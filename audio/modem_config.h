@@ -1,0 +1,75 @@
+// Builds the modem objects from the scalar settings an app (through JNI) or
+// the command-line tool passes, so that both configure them the same way.
+// Defaults are the modem's defaults: DSSS with a 127-chip code, 18.5 kHz
+// carrier, 4 bits per symbol and 8-byte tokens; multi-tone with ten tones
+// from 740 Hz, tone pairs as symbols and 5-byte tokens.
+#ifndef AUDIO_MODEM_CONFIG_H_
+#define AUDIO_MODEM_CONFIG_H_
+
+#include <array>
+#include <memory>
+#include <optional>
+#include <vector>
+
+#include "audio/audio_modem_encoder.h"
+#include "audio/sorvane/dtmf/dtmf_encoder_params.h"
+#include "audio/sorvane/symbol_wave_coder.h"
+
+namespace audio_sorvane {
+
+// The DSSS settings transmitter and receiver must share.
+struct DsssCoderConfig {
+  int number_of_taps = 7;
+  int code_number = 0;
+  int upsampling_factor = 15;
+  int bits_per_symbol = 4;
+  int min_cycles_per_frame = 4;
+  int baseband_decimation_factor = 3;
+  bool use_quadrature = false;
+  float sample_rate = 44100.0f;
+  float desired_carrier_frequency = 18500.0f;
+};
+
+struct DsssEncoderConfig {
+  DsssCoderConfig coder;
+  int token_length_bytes = 8;
+  bool append_check_symbol = false;
+  bool high_pass_at_carrier = false;
+  int broadcast_sample_rate = 44100;
+  float start_transition_duration = 0.005f;
+};
+
+// The multi-tone settings transmitter and receiver must share.
+struct DtmfConfig {
+  int bytes_in_token = 5;
+  bool use_checksum_symbol = false;
+  int baseband_decimation_factor = 16;
+  int tones_per_symbol = 2;
+  // Empty keeps the default tones and symbol table.
+  std::vector<float> tone_frequencies;
+  float sample_rate = 44100.0f;
+  float window_duration = 0.05f;
+  // Attack, decay, sustain, release (seconds) and sustain amplitude; without
+  // it the frame window is a half sine.
+  std::optional<std::array<float, 5>> adsr;
+};
+
+// The coder's parameter record, the code generated from (number_of_taps,
+// code_number). Out-of-range values end the process through CHECK when the
+// coder is built.
+SymbolWaveCoderParams MakeSymbolWaveCoderParams(const DsssCoderConfig& config);
+
+// Symbols per DSSS token: (8 / bits_per_symbol) * token bytes.
+int DsssSymbolsPerToken(int bits_per_symbol, int token_length_bytes);
+
+// Fills `params` (starting from the defaults); false when the ADSR window is
+// refused, which is logged.
+bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params);
+
+std::unique_ptr<AudioModemEncoder> MakeDsssEncoder(const DsssEncoderConfig& config);
+// Null when the ADSR window is refused.
+std::unique_ptr<AudioModemEncoder> MakeDtmfEncoder(const DtmfConfig& config);
+
+}  // namespace audio_sorvane
+
+#endif  // AUDIO_MODEM_CONFIG_H_

@@ -1,0 +1,123 @@
+#include "audio/sorvane/sorvane_encoder.h"
+
+#include <algorithm>
+#include <cmath>
+#include <utility>
+
+#include "audio/dsp/kiss_fft_util.h"
+#include "audio/sorvane/token_selector.h"
+#include "base/logging.h"
+
+namespace audio_sorvane {
+
+SorvaneEncoder::SorvaneEncoder(
+    std::shared_ptr<const SymbolWaveCoder> symbol_wave_coder,
+    const SorvaneEncoderParams& params)
+    : params_(params) {
+  CHECK(symbol_wave_coder);
+  symbol_wave_coder_ = std::move(symbol_wave_coder);
+  converter_ = std::make_unique<TokenSymbolConverter>(
+      symbol_wave_coder_->params().bits_per_symbol);
+  CHECK(params_.broadcast_sample_rate > 0.0);
+}
+
+bool SorvaneEncoder::Encode(const std::vector<uint8_t>& token_bytes,
+                            std::vector<float>* output) const {
+  std::vector<int> symbols;
+  converter_->TokenToSymbols(token_bytes, &symbols);
+  VLOG(1) << "Converted " << token_bytes.size() << " bytes to " << symbols.size()
+          << " symbols.";
+  return EncodeSymbols(symbols, output);
+}
+
+bool SorvaneEncoder::EncodeSymbols(const std::vector<int>& symbols,
+                                   std::vector<float>* output) const {
+  if (static_cast<int>(symbols.size()) != params_.num_symbols) {
+    LOG(ERROR) << "EncodeSymbols() called with input of size " << symbols.size()
+               << ", but expected " << params_.num_symbols << ".";
+    return false;
+  }
+  if (output == nullptr) {
+    LOG(ERROR) << "EncodeSymbols() called with null output pointer.";
+    return false;
+  }
+  const SymbolWaveCoder& coder = *symbol_wave_coder_;
+  std::vector<int> sequence = symbols;
+  if (params_.append_check_symbol) {
+    sequence.push_back(ComputeCheckSymbol(coder.alphabet_size(), symbols));
+  }
+
+  output->clear();
+  output->reserve((sequence.size() + 1) * coder.samples_per_frame());
+  const std::span<const float> start = coder.StartWaveform();
+  output->insert(output->end(), start.begin(), start.end());
+  for (int symbol : sequence) {
+    const std::span<const float> frame = coder.SymbolWaveform(symbol);
+    output->insert(output->end(), frame.begin(), frame.end());
+  }
+
+  const float sample_rate = coder.params().sample_rate;
+  if (params_.high_pass_at_carrier && !output->empty()) {
+    audio_dsp::HighPassFilter(*output, output, coder.CarrierFrequency(),
+                              sample_rate);
+  }
+  audio_dsp::FftResample(*output, output, sample_rate,
+                         params_.broadcast_sample_rate);
+
+  float peak = 0.0f;
+  for (float v : *output) peak = std::max(peak, std::fabs(v));
+  if (peak > 0.0f) {
+    const float scale = params_.peak_amplitude / peak;
+    for (float& v : *output) v *= scale;
+  }
+  return true;
+}
+
+int SorvaneEncoder::TransitionLength() const {
+  return std::max(0, static_cast<int>(std::lround(params_.broadcast_sample_rate *
+                                                  params_.transition_duration)));
+}
+
+bool SorvaneEncoder::MakeStartTransition(std::span<const float> input,
+                                         std::vector<float>* output) const {
+  if (input.empty()) {
+    LOG(ERROR) << "MakeStartTransition() called with empty input.";
+    return false;
+  }
+  if (output == nullptr) {
+    LOG(ERROR) << "MakeStartTransition() called with null output pointer.";
+    return false;
+  }
+  const int n = TransitionLength();
+  const int length = static_cast<int>(input.size());
+  output->resize(n);
+  if (n == 0) return true;
+  int s = length - 1 - (n - 1) % length;
+  for (int i = 0; i < n; ++i) {
+    (*output)[i] = static_cast<float>(i + 1) / static_cast<float>(n + 1) * input[s];
+    if (++s == length) s = 0;
+  }
+  return true;
+}
+
+bool SorvaneEncoder::MakeStopTransition(std::span<const float> input,
+                                        std::vector<float>* output) const {
+  if (input.empty()) {
+    LOG(ERROR) << "MakeStopTransition() called with empty input.";
+    return false;
+  }
+  if (output == nullptr) {
+    LOG(ERROR) << "MakeStopTransition() called with null output pointer.";
+    return false;
+  }
+  const int n = TransitionLength();
+  const int length = static_cast<int>(input.size());
+  output->resize(n);
+  for (int i = 0, s = 0; i < n; ++i) {
+    (*output)[i] = static_cast<float>(n - i) / static_cast<float>(n + 1) * input[s];
+    if (++s == length) s = 0;
+  }
+  return true;
+}
+
+}  // namespace audio_sorvane
