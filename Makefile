@@ -21,10 +21,11 @@ test: build
 	@cd $(BUILD_DIR) && ctest --output-on-failure -j $(JOBS)
 
 demo: build
-	@$(BUILD_DIR)/tools/sorvel --help
+	@mkdir -p out
+	@$(BUILD_DIR)/tools/sorvel encode --token 536f7276656c --crc -o out/token.wav
 
 bench: build
 	@$(BUILD_DIR)/bench/sorvel_benchmarks
 
 clean:
-	@rm -rf $(BUILD_DIR)
+	@rm -rf $(BUILD_DIR) out

@@ -1,8 +1,10 @@
 #include "audio/modem_config.h"
 
+#include <sstream>
 #include <utility>
 
 #include "audio/sorvane/code_signal_generator.h"
+#include "audio/sorvane/token_symbol_converter.h"
 
 namespace audio_sorvane {
 
@@ -40,6 +42,84 @@ bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params) 
   }
   *params = std::move(filled);
   return true;
+}
+
+namespace {
+
+template <typename... Parts>
+std::string Concat(const Parts&... parts) {
+  std::ostringstream out;
+  (out << ... << parts);
+  return out.str();
+}
+
+}  // namespace
+
+std::string ValidateDsssCoderConfig(const DsssCoderConfig& c) {
+  if (c.number_of_taps < kMinTaps || c.number_of_taps > kMaxTaps) {
+    return Concat("number_of_taps must be in [", kMinTaps, ", ", kMaxTaps, "], got ",
+                  c.number_of_taps);
+  }
+  if (c.code_number < 0 || c.code_number >= NumCodesForTaps(c.number_of_taps)) {
+    return Concat("code_number must be in [0, ", NumCodesForTaps(c.number_of_taps) - 1,
+                  "] for ", c.number_of_taps, " taps, got ", c.code_number);
+  }
+  if (!BitsPerSymbolOk(c.bits_per_symbol)) {
+    return Concat("bits_per_symbol must be 1, 2, 4 or 8, got ", c.bits_per_symbol);
+  }
+  if (!(c.sample_rate > 0.0f)) return Concat("sample_rate must be positive, got ", c.sample_rate);
+  if (c.upsampling_factor <= 0 || c.baseband_decimation_factor <= 0 ||
+      c.upsampling_factor % c.baseband_decimation_factor != 0) {
+    return Concat("baseband_decimation_factor (", c.baseband_decimation_factor,
+                  ") must be positive and divide upsampling_factor (", c.upsampling_factor,
+                  ")");
+  }
+  if (!(c.desired_carrier_frequency >= 0.0f &&
+        c.desired_carrier_frequency <= c.sample_rate / 2)) {
+    return Concat("carrier frequency must be in [0, ", c.sample_rate / 2, "] Hz, got ",
+                  c.desired_carrier_frequency);
+  }
+  if (c.min_cycles_per_frame < 0) {
+    return Concat("min_cycles_per_frame must be >= 0, got ", c.min_cycles_per_frame);
+  }
+  return "";
+}
+
+std::string ValidateDtmfConfig(const DtmfConfig& c) {
+  if (!(c.sample_rate > 0.0f)) return Concat("sample_rate must be positive, got ", c.sample_rate);
+  if (c.bytes_in_token <= 0) return Concat("token bytes must be positive, got ", c.bytes_in_token);
+  if (c.baseband_decimation_factor <= 0) {
+    return Concat("baseband_decimation_factor must be positive, got ",
+                  c.baseband_decimation_factor);
+  }
+  DtmfEncoderParams defaults;
+  defaults.sample_rate = c.sample_rate;
+  defaults.window_duration = c.window_duration;
+  defaults.baseband_decimation_factor = c.baseband_decimation_factor;
+  if (!(c.window_duration > 0.0f) || FrameSize(defaults) <= 0) {
+    return Concat("window_duration ", c.window_duration, " s gives no samples per frame");
+  }
+  const std::vector<float>& tones =
+      c.tone_frequencies.empty() ? defaults.tone_frequencies : c.tone_frequencies;
+  for (float f : tones) {
+    if (!(f >= 0.0f && f < c.sample_rate / 2)) {
+      return Concat("tone frequency ", f, " Hz must be in [0, ", c.sample_rate / 2, ")");
+    }
+  }
+  const size_t n = tones.size();
+  if (c.tones_per_symbol <= 0 || static_cast<size_t>(c.tones_per_symbol) > n) {
+    return Concat("tones_per_symbol must be in [1, ", n, "], got ", c.tones_per_symbol);
+  }
+  if (!c.tone_frequencies.empty()) {
+    const size_t symbols = MakeSymbolTable(static_cast<int>(n), c.tones_per_symbol).size();
+    if (symbols < 3 || n * (n - 1) / 2 < symbols) {
+      return Concat(n, " tones taken ", c.tones_per_symbol, " at a time give ", symbols,
+                    " symbols; between 3 and ", n * (n - 1) / 2, " are needed");
+    }
+  } else if (c.tones_per_symbol != 2) {
+    return "the default tones are used in pairs; give tone frequencies to change that";
+  }
+  return "";
 }
 
 std::unique_ptr<AudioModemEncoder> MakeDsssEncoder(const DsssEncoderConfig& config) {

@@ -9,6 +9,7 @@
 #include <array>
 #include <memory>
 #include <optional>
+#include <string>
 #include <vector>
 
 #include "audio/audio_modem_encoder.h"
@@ -65,6 +66,13 @@ int DsssSymbolsPerToken(int bits_per_symbol, int token_length_bytes);
 // Fills `params` (starting from the defaults); false when the ADSR window is
 // refused, which is logged.
 bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params);
+
+// An empty string when the settings are usable, else one line naming the
+// first problem. Building from invalid settings ends the process (the
+// checks guard the modem's invariants), so tools that take settings from
+// users validate first.
+std::string ValidateDsssCoderConfig(const DsssCoderConfig& config);
+std::string ValidateDtmfConfig(const DtmfConfig& config);
 
 std::unique_ptr<AudioModemEncoder> MakeDsssEncoder(const DsssEncoderConfig& config);
 // Null when the ADSR window is refused.

@@ -4,6 +4,7 @@
 
 #include "CLI/CLI.hpp"
 #include "base/logging.h"
+#include "tools/encode_command.h"
 
 int main(int argc, char** argv) {
   CLI::App app{
@@ -14,11 +15,17 @@ int main(int argc, char** argv) {
                  "Log level for detailed library messages (0 = off)")
       ->check(CLI::NonNegativeNumber);
   app.require_subcommand(0, 1);
-  app.callback([&] { sorvel_base::SetVlogLevel(verbosity); });
+  app.parse_complete_callback([&] { sorvel_base::SetVlogLevel(verbosity); });
 
-  CLI11_PARSE(app, argc, argv);
-  if (app.get_subcommands().empty()) {
-    std::cout << app.help();
+  int exit_code = EXIT_SUCCESS;
+  sorvel_cli::RegisterEncodeCommand(&app, &exit_code);
+
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::ParseError& e) {
+    const int code = app.exit(e);
+    return code == 0 ? 0 : sorvel_cli::kUsageError;
   }
-  return EXIT_SUCCESS;
+  if (app.get_subcommands().empty()) std::cout << app.help();
+  return exit_code;
 }

@@ -1,0 +1,39 @@
+#!/usr/bin/env bash
+# Command-line behaviour of `sorvel encode`: refusals exit with 2 and one
+# line naming the problem; good tokens become WAV files of the right length.
+set -u
+sorvel=$1
+dir=$(mktemp -d)
+trap 'rm -rf "$dir"' EXIT
+failures=0
+
+expect_refusal() {  # expect_refusal <text in message> <args...>
+  local text=$1; shift
+  local err
+  err=$("$sorvel" encode "$@" 2>&1 >/dev/null)
+  local rc=$?
+  if [ $rc -ne 2 ] || [[ "$err" != *"$text"* ]]; then
+    echo "FAIL: encode $* -> rc $rc, '$err' (wanted rc 2 and '$text')"
+    failures=$((failures + 1))
+  fi
+}
+
+expect_refusal "odd number of hex digits" --token 123 -o "$dir/x.wav"
+expect_refusal "not a hex digit" --token 12zz -o "$dir/x.wav"
+expect_refusal "8-byte tokens" --token 0102 -o "$dir/x.wav"
+expect_refusal "not in {dsss,dtmf}" --scheme fsk --token 01 -o "$dir/x.wav"
+expect_refusal "cannot write" --token 010203040506 --crc -o "$dir/missing/x.wav"
+expect_refusal "number_of_taps" --token 010203040506 --crc --number-of-taps 4 -o "$dir/x.wav"
+expect_refusal "ADSR window was refused" --scheme dtmf --token 0102030405 \
+  --adsr 0.1,0,0,0,1 -o "$dir/x.wav"
+
+# 17 frames of 1905 samples (start + 16 symbols), 16-bit mono + 44-byte header.
+"$sorvel" encode --token 010203040506 --crc -o "$dir/dsss.wav" >/dev/null
+size=$(stat -c %s "$dir/dsss.wav" 2>/dev/null || echo 0)
+[ "$size" -eq $((44 + 2 * 17 * 1905)) ] || { echo "FAIL: dsss.wav has $size bytes"; failures=$((failures + 1)); }
+# 9 frames of 2208 samples (spacer + 8 symbols).
+"$sorvel" encode --scheme dtmf --token 0102030405 -o "$dir/dtmf.wav" >/dev/null
+size=$(stat -c %s "$dir/dtmf.wav" 2>/dev/null || echo 0)
+[ "$size" -eq $((44 + 2 * 9 * 2208)) ] || { echo "FAIL: dtmf.wav has $size bytes"; failures=$((failures + 1)); }
+
+exit $((failures > 0))
