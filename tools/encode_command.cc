@@ -7,6 +7,7 @@
 #include <memory>
 
 #include "audio/dsp/kiss_fft.h"
+#include "sim/channel_simulator.h"
 #include "tools/wav_io.h"
 
 namespace sorvel_cli {
@@ -134,20 +135,6 @@ std::string PrepareEncoder(EncodeOptions& o,
   return "";
 }
 
-std::vector<float> RenderBroadcast(const audio_sorvane::AudioModemEncoder& encoder,
-                                   const std::vector<float>& token_audio,
-                                   float loop_seconds) {
-  std::vector<float> out;
-  encoder.MakeStartTransition(token_audio, &out);
-  const double wanted = loop_seconds * encoder.OutputSampleRate();
-  const int repeats = std::max(1, static_cast<int>(std::ceil(wanted / token_audio.size())));
-  for (int r = 0; r < repeats; ++r) out.insert(out.end(), token_audio.begin(), token_audio.end());
-  std::vector<float> stop;
-  encoder.MakeStopTransition(token_audio, &stop);
-  out.insert(out.end(), stop.begin(), stop.end());
-  return out;
-}
-
 void RegisterEncodeCommand(CLI::App* app, int* exit_code) {
   auto options = std::make_shared<EncodeOptions>();
   auto loop_seconds = std::make_shared<float>(0.0f);
@@ -172,7 +159,7 @@ void RegisterEncodeCommand(CLI::App* app, int* exit_code) {
       encoder->Encode(message, &audio, options->crc ? 2 : 0);
       if (audio.empty()) error = "the encoder refused the token (see the log line above)";
     }
-    if (error.empty() && *loop_seconds > 0) audio = RenderBroadcast(*encoder, audio, *loop_seconds);
+    if (error.empty() && *loop_seconds > 0) audio = sorvel_sim::RenderLoopedBroadcast(*encoder, audio, *loop_seconds);
     const int rate = static_cast<int>(encoder ? encoder->OutputSampleRate() : 0);
     if (error.empty()) error = WriteWav(*output, audio, rate);
     if (!error.empty()) {

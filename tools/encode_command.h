@@ -40,13 +40,6 @@ std::string PrepareEncoder(EncodeOptions& options,
                            std::unique_ptr<audio_sorvane::AudioModemEncoder>* encoder,
                            std::vector<uint8_t>* message);
 
-// Renders what a phone plays: for DSSS the start transition, the token
-// repeated to fill `loop_seconds` (at least once) and a fade-out; for the
-// multi-tone scheme the bursts back to back.
-std::vector<float> RenderBroadcast(const audio_sorvane::AudioModemEncoder& encoder,
-                                   const std::vector<float>& token_audio,
-                                   float loop_seconds);
-
 // Adds the `encode` subcommand.
 void RegisterEncodeCommand(CLI::App* app, int* exit_code);
 

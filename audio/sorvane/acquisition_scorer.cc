@@ -1,0 +1,348 @@
+#include "audio/sorvane/acquisition_scorer.h"
+
+#include <algorithm>
+#include <cmath>
+#include <cstring>
+#include <numbers>
+
+#include "audio/sorvane/sorvane_util.h"
+#include "base/logging.h"
+
+namespace audio_sorvane {
+namespace {
+
+using audio_dsp::FloatVector;
+
+// Eight floats, with GCC/Clang vector extensions: the same source becomes
+// SSE or NEON register pairs, or single AVX2 registers in the x86-64 clone
+// chosen at load time. The portable way to vectorise these loops on both
+// targets without intrinsics.
+typedef float Float8 __attribute__((vector_size(32)));
+// The helpers below are inlined into each clone; no 32-byte vector crosses a
+// real call boundary, so the ABI note on them does not apply.
+#if defined(__GNUC__) && !defined(__clang__)
+#pragma GCC diagnostic ignored "-Wpsabi"
+#endif
+
+#if defined(__x86_64__) && defined(__ELF__)
+#define SORVEL_MULTIVERSION __attribute__((target_clones("avx2", "default")))
+#else
+#define SORVEL_MULTIVERSION
+#endif
+
+[[gnu::always_inline]] inline Float8 Load8(const float* p) {
+  Float8 v;
+  std::memcpy(&v, p, sizeof(v));
+  return v;
+}
+
+[[gnu::always_inline]] inline float Sum8(Float8 v) {
+  return ((v[0] + v[1]) + (v[2] + v[3])) + ((v[4] + v[5]) + (v[6] + v[7]));
+}
+
+// re/im correlation of each chunk of `code` with the frame.
+SORVEL_MULTIVERSION void CorrelateChunks(const float* code, const float* frame_real,
+                                         const float* frame_imaginary, int num_chunks,
+                                         int chunk_size, int last_chunk_size,
+                                         float* out_real, float* out_imaginary) {
+  for (int c = 0; c < num_chunks; ++c) {
+    const int offset = c * chunk_size;
+    const int size = c + 1 < num_chunks ? chunk_size : last_chunk_size;
+    const float* t = code + offset;
+    const float* re = frame_real + offset;
+    const float* im = frame_imaginary + offset;
+    Float8 sum_re = {}, sum_im = {};
+    int k = 0;
+    for (; k + 8 <= size; k += 8) {
+      const Float8 tv = Load8(t + k);
+      sum_re += tv * Load8(re + k);
+      sum_im += tv * Load8(im + k);
+    }
+    float tail_re = 0.0f, tail_im = 0.0f;
+    for (; k < size; ++k) {
+      tail_re += t[k] * re[k];
+      tail_im += t[k] * im[k];
+    }
+    out_real[c] = Sum8(sum_re) + tail_re;
+    out_imaginary[c] = Sum8(sum_im) + tail_im;
+  }
+}
+
+// The same for eight consecutive frames at once: lane j of each sum is the
+// frame starting j samples later. Broadcasting the template value needs no
+// horizontal sums, which dominate the one-frame version.
+SORVEL_MULTIVERSION void CorrelateChunks8(const float* code, const float* frame_real,
+                                          const float* frame_imaginary, int num_chunks,
+                                          int chunk_size, int last_chunk_size,
+                                          float* out_real, float* out_imaginary) {
+  for (int c = 0; c < num_chunks; ++c) {
+    const int offset = c * chunk_size;
+    const int size = c + 1 < num_chunks ? chunk_size : last_chunk_size;
+    const float* t = code + offset;
+    const float* re = frame_real + offset;
+    const float* im = frame_imaginary + offset;
+    Float8 sum_re = {}, sum_im = {};
+    for (int k = 0; k < size; ++k) {
+      sum_re += t[k] * Load8(re + k);
+      sum_im += t[k] * Load8(im + k);
+    }
+    std::memcpy(out_real + 8 * c, &sum_re, sizeof(sum_re));
+    std::memcpy(out_imaginary + 8 * c, &sum_im, sizeof(sum_im));
+  }
+}
+
+// The powers of eight frames at once from their correlations (lane j of
+// entry c is frame j's chunk c): out[8 i + j] is frequency i of frame j. The
+// phasors are stored by frequency, one row of num_chunks per frequency.
+SORVEL_MULTIVERSION void FrequencyPowers8(const float* phasors_real,
+                                          const float* phasors_imaginary,
+                                          const float* corr_real, const float* corr_imaginary,
+                                          int num_frequencies, int num_chunks, float* out) {
+  for (int i = 0; i < num_frequencies; ++i) {
+    const float* pr = phasors_real + i * num_chunks;
+    const float* pi = phasors_imaginary + i * num_chunks;
+    Float8 acc_re = {}, acc_im = {};
+    for (int c = 0; c < num_chunks; ++c) {
+      const Float8 x = Load8(corr_real + 8 * c), y = Load8(corr_imaginary + 8 * c);
+      acc_re += pr[c] * x - pi[c] * y;
+      acc_im += pr[c] * y + pi[c] * x;
+    }
+    const Float8 p = acc_re * acc_re + acc_im * acc_im;
+    std::memcpy(out + 8 * i, &p, sizeof(p));
+  }
+}
+
+// power[i] = |sum_c phasor[i][c] corr[c]|^2. The phasors are stored by
+// chunk, `padded` frequencies (a multiple of 8) per chunk, so the loop runs
+// across frequencies and needs no horizontal sums.
+SORVEL_MULTIVERSION void FrequencyPowers(const float* phasors_real,
+                                         const float* phasors_imaginary,
+                                         const float* corr_real, const float* corr_imaginary,
+                                         int num_chunks, int padded, float* power) {
+  for (int i = 0; i < padded; i += 8) {
+    Float8 acc_re = {}, acc_im = {};
+    for (int c = 0; c < num_chunks; ++c) {
+      const Float8 a = Load8(phasors_real + c * padded + i);
+      const Float8 b = Load8(phasors_imaginary + c * padded + i);
+      const float x = corr_real[c], y = corr_imaginary[c];
+      acc_re += a * x - b * y;
+      acc_im += a * y + b * x;
+    }
+    const Float8 p = acc_re * acc_re + acc_im * acc_im;
+    std::memcpy(power + i, &p, sizeof(p));
+  }
+}
+
+// Delay N and gain alpha of two cascaded one-pole stages whose combined
+// impulse response has spread `width` frames: v = width^2 / 24,
+// a = 1 + (1 - sqrt(1 + 2v)) / v, N = round(2a / (1 - a)), alpha = 1 - a.
+void DesignNoiseSmoother(double width, int* delay, float* alpha) {
+  const double v = width * width / 24.0;
+  const double a = 1.0 + (1.0 - std::sqrt(1.0 + 2.0 * v)) / v;
+  *delay = static_cast<int>(std::lround(2.0 * a / (1.0 - a)));
+  *alpha = static_cast<float>(1.0 - a);
+}
+
+int SmootherDelay(float width) {
+  int delay;
+  float alpha;
+  DesignNoiseSmoother(width, &delay, &alpha);
+  return delay;
+}
+
+}  // namespace
+
+size_t AcquisitionScorer::FrameWindow::Fill(std::span<const float> input) {
+  const size_t n = std::min(input.size(), samples.size() - write);
+  std::copy_n(input.begin(), n, samples.begin() + write);
+  write += static_cast<int>(n);
+  return n;
+}
+
+void AcquisitionScorer::FrameWindow::Advance() {
+  ++read;
+  if (read > static_cast<int>(samples.size()) - frame_size) {
+    std::copy(samples.begin() + read, samples.begin() + write, samples.begin());
+    write -= read;
+    shifted += read;
+    read = 0;
+  }
+}
+
+AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
+                                     std::span<const float> frequency_offsets,
+                                     int num_chunks, int detection_window,
+                                     float smoothing_width)
+    : frame_size_(static_cast<int>(code_template.size())),
+      num_frequencies_(static_cast<int>(frequency_offsets.size())),
+      num_chunks_(num_chunks),
+      detection_window_size_(std::max(2 * frame_size_ - 1, detection_window)),
+      detection_num_frames_((detection_window_size_ + 1 - frame_size_) / frame_size_),
+      detection_num_shifts_(detection_window_size_ + 1 - detection_num_frames_ * frame_size_),
+      chunk_size_(0),
+      last_chunk_size_(0),
+      power_history_(std::max({SmootherDelay(smoothing_width) + 1,
+                               detection_window_size_,
+                               std::max(SmootherDelay(smoothing_width), 10)})) {
+  CHECK(num_chunks_ > 0);
+  CHECK(detection_num_frames_ >= 1);
+  CHECK(detection_num_shifts_ >= frame_size_);
+  DesignNoiseSmoother(smoothing_width, &noise_delay_, &noise_alpha_);
+  warmup_frames_ = std::max(noise_delay_, 10);
+
+  chunk_size_ = static_cast<int>(
+      std::ceil(static_cast<float>(frame_size_) / static_cast<float>(num_chunks_)));
+  last_chunk_size_ = frame_size_ - (num_chunks_ - 1) * chunk_size_;
+  code_.assign(code_template.begin(), code_template.end());
+  std::vector<float> steps(frequency_offsets.begin(), frequency_offsets.end());
+  PhasorMatrix(steps, num_chunks_, 2.0 * std::numbers::pi / num_chunks_, &phasor_matrix_);
+  padded_frequencies_ = (num_frequencies_ + 7) / 8 * 8;
+  correlations_real_.assign(num_chunks_, 0.0f);
+  correlations_imaginary_.assign(num_chunks_, 0.0f);
+  powers_.assign(padded_frequencies_, 0.0f);
+  batch_real_.assign(8 * num_chunks_, 0.0f);
+  batch_powers_.assign(8 * num_frequencies_, 0.0f);
+  matrix_real_.resize(static_cast<size_t>(num_frequencies_) * num_chunks_);
+  matrix_imaginary_.resize(matrix_real_.size());
+  for (int i = 0; i < num_frequencies_; ++i) {
+    for (int c = 0; c < num_chunks_; ++c) {
+      matrix_real_[i * num_chunks_ + c] = phasor_matrix_(i, c).real();
+      matrix_imaginary_[i * num_chunks_ + c] = phasor_matrix_(i, c).imag();
+    }
+  }
+  batch_imaginary_.assign(8 * num_chunks_, 0.0f);
+  phasors_real_.assign(static_cast<size_t>(num_chunks_) * padded_frequencies_, 0.0f);
+  phasors_imaginary_.assign(phasors_real_.size(), 0.0f);
+  for (int c = 0; c < num_chunks_; ++c) {
+    for (int i = 0; i < num_frequencies_; ++i) {
+      phasors_real_[c * padded_frequencies_ + i] = phasor_matrix_(i, c).real();
+      phasors_imaginary_[c * padded_frequencies_ + i] = phasor_matrix_(i, c).imag();
+    }
+  }
+  for (FrameWindow* window : {&real_window_, &imaginary_window_}) {
+    window->samples.assign(2 * frame_size_ - 1, 0.0f);
+    window->frame_size = frame_size_;
+  }
+  Reset();
+}
+
+void AcquisitionScorer::Reset() {
+  frame_counter_ = 0;
+  real_window_.Clear();
+  imaginary_window_.Clear();
+  power_history_.Fill(FloatVector::Zero(num_frequencies_));
+}
+
+void AcquisitionScorer::ZeroHistory() {
+  std::fill(real_window_.samples.begin(), real_window_.samples.end(), 0.0f);
+  std::fill(imaginary_window_.samples.begin(), imaginary_window_.samples.end(), 0.0f);
+  power_history_.Fill(FloatVector::Zero(num_frequencies_));
+}
+
+void AcquisitionScorer::ScoreSamples(std::span<const float> baseband_real_signal,
+                                     std::span<const float> baseband_imaginary_signal,
+                                     std::vector<float>* acquisition_scores) {
+  if (baseband_real_signal.size() != baseband_imaginary_signal.size()) {
+    LOG(WARNING) << "Baseband signal size mismatch: " << baseband_real_signal.size()
+                 << " vs. " << baseband_imaginary_signal.size();
+  }
+  CHECK(baseband_real_signal.size() == baseband_imaginary_signal.size());
+  CHECK(acquisition_scores);
+  acquisition_scores->clear();
+  size_t consumed = 0;
+  const size_t total = baseband_real_signal.size();
+  do {
+    real_window_.Fill(baseband_real_signal.subspan(consumed));
+    consumed += imaginary_window_.Fill(baseband_imaginary_signal.subspan(consumed));
+    while (real_window_.HasFrame() && imaginary_window_.HasFrame()) {
+      const int available =
+          std::min(real_window_.write, imaginary_window_.write) - real_window_.read -
+          frame_size_ + 1;
+      if (available >= 8) {
+        // Eight frames in one pass; advancing may compact the windows, but
+        // every sample the batch needs has been read by then.
+        CorrelateChunks8(code_.data(), real_window_.Frame().data(),
+                         imaginary_window_.Frame().data(), num_chunks_, chunk_size_,
+                         last_chunk_size_, batch_real_.data(), batch_imaginary_.data());
+        FrequencyPowers8(matrix_real_.data(), matrix_imaginary_.data(), batch_real_.data(),
+                         batch_imaginary_.data(), num_frequencies_, num_chunks_,
+                         batch_powers_.data());
+        for (int j = 0; j < 8; ++j) {
+          const float score = FinishFrame(batch_powers_.data() + j, 8);
+          if (frame_counter_ > noise_delay_) acquisition_scores->push_back(score);
+          real_window_.Advance();
+          imaginary_window_.Advance();
+        }
+        continue;
+      }
+      const float score = ScoreFrame(real_window_.Frame(), imaginary_window_.Frame());
+      if (frame_counter_ > noise_delay_) acquisition_scores->push_back(score);
+      real_window_.Advance();
+      imaginary_window_.Advance();
+    }
+  } while (consumed < total);
+}
+
+float AcquisitionScorer::ScoreFrame(std::span<const float> baseband_frame_real,
+                                    std::span<const float> baseband_frame_imaginary) {
+  CHECK_EQ(baseband_frame_real.size(), frame_size_);
+  CHECK_EQ(baseband_frame_imaginary.size(), frame_size_);
+  CorrelateChunks(code_.data(), baseband_frame_real.data(), baseband_frame_imaginary.data(),
+                  num_chunks_, chunk_size_, last_chunk_size_, correlations_real_.data(),
+                  correlations_imaginary_.data());
+  FrequencyPowers(phasors_real_.data(), phasors_imaginary_.data(), correlations_real_.data(),
+                  correlations_imaginary_.data(), num_chunks_, padded_frequencies_,
+                  powers_.data());
+  return FinishFrame(powers_.data(), 1);
+}
+
+float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
+  const int n = frame_counter_;
+  float* power = power_history_[n].data();
+  float power_sum = 0.0f;
+  for (int i = 0; i < num_frequencies_; ++i) {
+    power[i] = powers[i * stride];
+    power_sum += power[i];
+  }
+
+  float score = 0.0f;
+  if (n == warmup_frames_ - 1) {
+    float sum = 0.0f;
+    for (int k = 0; k < warmup_frames_; ++k) sum += power_history_[k].sum();
+    noise_level_1_ = noise_level_2_ =
+        sum / static_cast<float>(num_frequencies_ * warmup_frames_);
+  } else if (n > warmup_frames_ - 1) {
+    const float x = power_sum / static_cast<float>(num_frequencies_);
+    noise_level_1_ += noise_alpha_ * (x - noise_level_1_);
+    noise_level_2_ += noise_alpha_ * (noise_level_1_ - noise_level_2_);
+  }
+  if (n >= warmup_frames_ - 1) {
+    const float* delayed = power_history_[n - noise_delay_].data();
+    const float peak = *std::max_element(delayed, delayed + num_frequencies_);
+    score = peak / (noise_level_2_ + 1e-12f);
+  }
+  ++frame_counter_;
+  return score;
+}
+
+float AcquisitionScorer::DetectionScore(bool normalize) const {
+  if (frame_size_ + frame_counter_ <= detection_window_size_) return 0.0f;
+  FloatVector accumulated(num_frequencies_);
+  float peak = 0.0f;
+  double total = 0.0;
+  for (int s = 0; s < detection_num_shifts_; ++s) {
+    accumulated.setZero();
+    for (int m = 0; m < detection_num_frames_; ++m) {
+      accumulated += power_history_[frame_counter_ - 1 - s - m * frame_size_];
+    }
+    peak = std::max(peak, accumulated.maxCoeff());
+    total += accumulated.sum();
+  }
+  if (normalize) {
+    peak /= std::max(static_cast<float>(total / (detection_num_frames_ * detection_num_shifts_)),
+                     1e-12f);
+  }
+  return peak;
+}
+
+}  // namespace audio_sorvane

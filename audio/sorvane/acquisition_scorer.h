@@ -1,0 +1,126 @@
+// Decides, frame by frame, whether a DSSS broadcast is on the air.
+//
+// Fed the decimated complex baseband, it slides the spreading-code template
+// over it one sample at a time. For each position ("frame") n the template
+// is cut into num_chunks pieces; each piece is correlated coherently and the
+// pieces are combined for every candidate carrier offset f_i (cycles per
+// frame) with the phasors exp(+j c 2 pi f_i / num_chunks):
+//   p_n[i] = | sum_c phasor[i][c] corr_c(n) |^2.
+// The acquisition score of frame n is max_i p_n[i] over a noise level, the
+// mean of p over frequencies smoothed by two one-pole stages; the smoother
+// delay N is compensated, so the score of frame n is emitted N frames later.
+// The detection score integrates p non-coherently over whole code periods
+// in a detection window and normalises the best bin by the total power.
+//
+// Not thread safe. Fatal checks guard the geometry and mismatched inputs.
+#ifndef AUDIO_SORVANE_ACQUISITION_SCORER_H_
+#define AUDIO_SORVANE_ACQUISITION_SCORER_H_
+
+#include <span>
+#include <vector>
+
+#include "audio/dsp/eigen_types.h"
+#include "audio/sorvane/circular_array.h"
+
+namespace audio_sorvane {
+
+class AcquisitionScorer {
+ public:
+  // `code_template`: one baseband frame of the code (F samples);
+  // `frequency_offsets` in carrier cycles per frame; `detection_window` in
+  // baseband samples; `smoothing_width` sets the noise smoother's spread.
+  AcquisitionScorer(std::span<const float> code_template,
+                    std::span<const float> frequency_offsets, int num_chunks,
+                    int detection_window, float smoothing_width);
+
+  // Consumes equal-length real and imaginary baseband blocks and replaces
+  // `acquisition_scores` with the scores that became available.
+  void ScoreSamples(std::span<const float> baseband_real_signal,
+                    std::span<const float> baseband_imaginary_signal,
+                    std::vector<float>* acquisition_scores);
+
+  // The detection score over the most recent frames (0 until enough frames
+  // were seen). With `normalize`, the best bin over the mean total power per
+  // shift.
+  float DetectionScore(bool normalize) const;
+
+  // Starts over: no frames, empty windows, zero history. The noise levels
+  // are re-seeded after the next warm-up.
+  void Reset();
+  // Zeroes the window samples and the history, keeping positions and count.
+  void ZeroHistory();
+
+  int frame_size() const { return frame_size_; }
+  int noise_delay() const { return noise_delay_; }
+  float noise_alpha() const { return noise_alpha_; }
+  int frame_counter() const { return frame_counter_; }
+  int detection_window_size() const { return detection_window_size_; }
+  int history_size() const { return power_history_.size(); }
+
+ private:
+  // A sliding window over one baseband stream that holds up to 2F - 1
+  // samples and compacts itself once per F frames.
+  struct FrameWindow {
+    std::vector<float> samples;
+    int frame_size = 0;
+    int shifted = 0;
+    int read = 0;
+    int write = 0;
+
+    size_t Fill(std::span<const float> input);
+    bool HasFrame() const { return read + frame_size <= write; }
+    std::span<const float> Frame() const {
+      return std::span<const float>(samples).subspan(read, frame_size);
+    }
+    void Advance();
+    void Clear() { shifted = read = write = 0; }
+  };
+
+  // Scores the frame at the windows' read positions; returns the score of
+  // frame frame_counter_ - N.
+  float ScoreFrame(std::span<const float> baseband_frame_real,
+                   std::span<const float> baseband_frame_imaginary);
+  // Stores the frequency powers (num_frequencies_ values `stride` apart) in
+  // the history, updates the noise level and returns the score of frame
+  // counter - N.
+  float FinishFrame(const float* powers, int stride);
+
+  int frame_size_;
+  int num_frequencies_;
+  int num_chunks_;
+  int detection_window_size_;
+  int detection_num_frames_;
+  int detection_num_shifts_;
+  int chunk_size_;
+  int last_chunk_size_;
+  // The code template; chunk c is code_[c * chunk_size_ ...].
+  std::vector<float> code_;
+  audio_dsp::ComplexMatrix phasor_matrix_;
+  int frame_counter_ = 0;
+  FrameWindow real_window_;
+  FrameWindow imaginary_window_;
+  // The chunk correlations and the phasor matrix split into real and
+  // imaginary parts; the phasors stored by chunk, frequencies padded to a
+  // multiple of 8 for the vector loops.
+  int padded_frequencies_ = 0;
+  std::vector<float> correlations_real_;
+  std::vector<float> correlations_imaginary_;
+  std::vector<float> phasors_real_;  // num_chunks_ rows of padded_frequencies_
+  std::vector<float> phasors_imaginary_;
+  std::vector<float> powers_;        // padded_frequencies_ scratch
+  std::vector<float> batch_real_;    // 8 frames' correlations per chunk
+  std::vector<float> batch_imaginary_;
+  std::vector<float> batch_powers_;      // 8 frames per frequency
+  std::vector<float> matrix_real_;       // the phasors by frequency
+  std::vector<float> matrix_imaginary_;
+  int noise_delay_;
+  float noise_alpha_;
+  float noise_level_1_ = 0.0f;
+  float noise_level_2_ = 0.0f;
+  int warmup_frames_;
+  CircularArray<audio_dsp::FloatVector> power_history_;
+};
+
+}  // namespace audio_sorvane
+
+#endif  // AUDIO_SORVANE_ACQUISITION_SCORER_H_

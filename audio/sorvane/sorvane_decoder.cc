@@ -1,0 +1,386 @@
+#include "audio/sorvane/sorvane_decoder.h"
+
+#include <algorithm>
+#include <cmath>
+#include <numbers>
+#include <utility>
+
+#include "audio/dsp/box_filter.h"
+#include "audio/dsp/number_util.h"
+#include "audio/dsp/resampler.h"
+#include "audio/sorvane/compute_buffer_truncation.h"
+#include "audio/sorvane/decoding_group.h"
+#include "audio/sorvane/sorvane_util.h"
+#include "base/logging.h"
+
+namespace audio_sorvane {
+namespace {
+
+using audio_dsp::ComplexVector;
+using audio_dsp::FloatVector;
+
+constexpr double kSpeedOfSound = 340.0;  // m/s
+constexpr double kMaxSavedSeconds = 30.0;
+
+}  // namespace
+
+SorvaneDecoder::SorvaneDecoder(std::shared_ptr<const SymbolWaveCoder> symbol_wave_coder,
+                               const SorvaneDecoderParams& params)
+    : params_(params) {
+  CHECK(symbol_wave_coder);
+  coder_ = std::move(symbol_wave_coder);
+  const SymbolWaveCoderParams& coder_params = coder_->params();
+  frame_size_ = coder_->samples_per_frame() / coder_params.baseband_decimation_factor;
+  baseband_rate_ = coder_params.sample_rate /
+                   static_cast<float>(coder_params.baseband_decimation_factor);
+  max_doppler_ = static_cast<float>(params_.max_speed * coder_->carrier_cycles_per_frame() /
+                                    kSpeedOfSound);
+
+  std::vector<float> acquisition_grid;
+  FrequencyGrid(params_.acquisition_frequency_step, max_doppler_, &acquisition_grid);
+  scorer_ = std::make_unique<AcquisitionScorer>(
+      coder_->baseband_code(), acquisition_grid, params_.num_chunks,
+      static_cast<int>(std::lround(params_.detection_duration * baseband_rate_)),
+      static_cast<float>(params_.noise_smoothing_width));
+
+  // Phase blocks short enough that the largest Doppler turns the phase by at
+  // most a sixteenth of a cycle within one.
+  phase_block_size_ = std::max(
+      1, static_cast<int>(std::ceil(frame_size_ / std::max(16.0 * max_doppler_, 1.0))));
+  const int x = static_cast<int>(std::ceil(params_.frame_extension * frame_size_));
+  extended_size_ = audio_dsp::RoundUpToMultiple(frame_size_ + 2 * x, phase_block_size_);
+  extension_ = (extended_size_ - frame_size_) / 2;
+  PeriodicPad<float>(coder_->baseband_code(), extension_,
+                     extended_size_ - frame_size_ - extension_, &extended_code_);
+  extended_window_.resize(extended_size_);
+  for (int i = 0; i < extended_size_; ++i) {
+    extended_window_[i] = static_cast<float>(std::sin(std::numbers::pi * i / extended_size_));
+  }
+  FrequencyGrid(params_.symbol_frequency_step, max_doppler_, &symbol_frequencies_);
+  PhasorMatrix(symbol_frequencies_, extended_size_ / phase_block_size_,
+               -2.0 * std::numbers::pi / (frame_size_ / phase_block_size_), &symbol_phasors_);
+
+  if (params_.use_designed_lowpass) {
+    smoothing_filter_ = std::make_unique<audio_dsp::ComplexFirFilter>(DesignLowpassTaps(
+        params_.lowpass_num_taps, params_.lowpass_cutoff,
+        static_cast<float>(coder_params.upsampling_factor /
+                           coder_params.baseband_decimation_factor)));
+  } else {
+    smoothing_filter_ = std::make_unique<audio_dsp::ComplexFirFilter>(
+        std::vector<std::complex<float>>{{0.25f, 0.0f}, {0.5f, 0.0f}, {0.25f, 0.0f}});
+  }
+
+  TokenSelectorParams selector;
+  selector.alphabet_size = coder_->alphabet_size();
+  selector.spacer = coder_->alphabet_size() - 1;
+  selector.symbols_in_token = params_.symbols_in_token;
+  selector.append_check_symbol = params_.append_check_symbol;
+  selector.max_candidates_to_consider = params_.max_candidates_to_consider;
+  selector.max_candidates_rank = params_.max_candidates_rank;
+  selector.max_candidates_to_return = params_.max_candidates_to_return;
+  token_selector_ = std::make_unique<TokenSelector>(selector);
+  converter_ = std::make_unique<TokenSymbolConverter>(coder_params.bits_per_symbol);
+}
+
+void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
+  CHECK(num_channels > 0);
+  num_channels_ = num_channels;
+  sample_rate_ = sample_rate;
+  const float coder_rate = coder_->params().sample_rate;
+  max_buffer_size_ = static_cast<int>(std::lround(params_.buffer_duration * sample_rate));
+  const int frames_per_token =
+      params_.symbols_in_token + (params_.append_check_symbol ? 1 : 0) + 1;
+  max_good_block_size_ = static_cast<int>(std::lround(
+      coder_->samples_per_frame() / coder_rate * frames_per_token * sample_rate));
+  input_per_baseband_ = static_cast<double>(sample_rate) / baseband_rate_;
+  const double carrier = static_cast<double>(coder_rate) * coder_->carrier_cycles_per_frame() /
+                         coder_->samples_per_frame();
+  const double omega = -2.0 * std::numbers::pi * carrier / sample_rate;
+  rotation_ = {std::cos(omega), std::sin(omega)};
+  oscillator_ = {1.0, 0.0};
+  baseband_resampler_ = std::make_unique<audio_dsp::RationalFactorResampler<std::complex<float>>>(
+      audio_dsp::DefaultResamplingKernel(sample_rate, baseband_rate_), 2000);
+  CHECK(baseband_resampler_->Valid()) << "Failed to initialize RationalFactorResampler.";
+
+  smoothing_filter_->Reset();
+  scorer_->Reset();
+  baseband_real_.Clear();
+  baseband_imaginary_.Clear();
+  acquisition_scores_.Clear();
+  received_samples_.Clear();
+  num_scored_ = 0;
+  samples_processed_ = 0;
+  symbol_score_cache_.clear();
+  initialized_ = true;
+}
+
+void SorvaneDecoder::ResetStream() {
+  received_samples_.Zero();
+  baseband_real_.Zero();
+  baseband_imaginary_.Zero();
+  acquisition_scores_.Zero();
+  smoothing_filter_->Reset();
+  scorer_->ZeroHistory();
+  symbol_score_cache_.clear();
+}
+
+void SorvaneDecoder::WipeInternalData() {
+  if (!initialized_) return;
+  ResetStream();
+  Initialize(num_channels_, sample_rate_);
+}
+
+int SorvaneDecoder::GetMaxSafeInputSize() const {
+  if (!initialized_) return 0;
+  return std::max(0, max_buffer_size_ - max_good_block_size_) * num_channels_;
+}
+
+void SorvaneDecoder::ProcessSamples(std::span<const float> received_samples) {
+  if (!initialized_) {
+    LOG(ERROR) << "ProcessSamples() called before call to Initialize().";
+    return;
+  }
+  const int input_size = static_cast<int>(received_samples.size()) / num_channels_;
+  const int buffered_size = static_cast<int>(
+      std::ceil(input_per_baseband_ * (acquisition_scores_.size() + 1)));
+  const BufferTruncation truncation = ComputeBufferTruncation(
+      input_size, buffered_size, max_good_block_size_, max_buffer_size_);
+  const int skip = truncation.skip * num_channels_;
+  const int drop = static_cast<int>(std::ceil(truncation.drop / input_per_baseband_));
+  if (skip >= 1) {
+    ResetStream();
+    Initialize(num_channels_, sample_rate_);
+    received_samples = received_samples.subspan(
+        std::min<size_t>(static_cast<size_t>(skip), received_samples.size()));
+  } else if (drop >= 1) {
+    const int d = std::min(audio_dsp::RoundUpToMultiple(drop, frame_size_),
+                           acquisition_scores_.size());
+    num_scored_ -= d;
+    baseband_real_.Discard(d);
+    baseband_imaginary_.Discard(d);
+    acquisition_scores_.Discard(d);
+    const int first_kept = extension_ + baseband_real_.num_discarded_samples();
+    symbol_score_cache_.erase(symbol_score_cache_.begin(),
+                              symbol_score_cache_.lower_bound(first_kept));
+  }
+
+  if (num_channels_ == 1) {
+    ProcessMono(received_samples);
+  } else {
+    CHECK(received_samples.size() % num_channels_ == 0);
+    mono_.assign(received_samples.size() / num_channels_, 0.0f);
+    for (size_t i = 0; i < mono_.size(); ++i) {
+      for (int c = 0; c < num_channels_; ++c) mono_[i] += received_samples[i * num_channels_ + c];
+    }
+    ProcessMono(mono_);
+  }
+
+  scorer_->ScoreSamples(baseband_real_.View(num_scored_), baseband_imaginary_.View(num_scored_),
+                        &new_scores_);
+  acquisition_scores_.Append(new_scores_);
+  num_scored_ = baseband_real_.size();
+}
+
+void SorvaneDecoder::ProcessMono(std::span<const float> samples) {
+  if (params_.save_received_samples) {
+    const int cap = static_cast<int>(std::lround(kMaxSavedSeconds * sample_rate_));
+    const int excess = received_samples_.size() + static_cast<int>(samples.size()) - cap;
+    if (excess > 0) received_samples_.Discard(std::min(excess, received_samples_.size()));
+    received_samples_.Append(samples);
+  }
+  mixed_.resize(samples.size());
+  std::complex<double> oscillator = oscillator_;
+  for (size_t i = 0; i < samples.size(); ++i) {
+    mixed_[i] = std::complex<float>(static_cast<double>(samples[i]) * oscillator);
+    oscillator *= rotation_;
+  }
+  // Renormalise once per block so rounding cannot make the amplitude drift.
+  oscillator_ = oscillator / std::abs(oscillator);
+
+  baseband_resampler_->ProcessSamples(mixed_, &resampled_);
+  smoothing_filter_->Filter(resampled_, &filtered_);
+  parts_.resize(filtered_.size());
+  for (size_t i = 0; i < filtered_.size(); ++i) parts_[i] = filtered_[i].real();
+  baseband_real_.Append(parts_);
+  for (size_t i = 0; i < filtered_.size(); ++i) parts_[i] = filtered_[i].imag();
+  baseband_imaginary_.Append(parts_);
+  samples_processed_ += static_cast<int64_t>(samples.size());
+}
+
+bool SorvaneDecoder::DetectBroadcaster() {
+  if (!initialized_) {
+    LOG(ERROR) << "DetectBroadcaster() called before call to Initialize().";
+    return false;
+  }
+  return scorer_->DetectionScore(/*normalize=*/true) >= params_.detection_threshold;
+}
+
+bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
+  if (!initialized_) {
+    LOG(ERROR) << "GetToken() called before call to Initialize().";
+    return false;
+  }
+  CHECK(decode_results);
+  decode_results->tokens.clear();
+  decode_results->detection_times.clear();
+  decode_results->detection_scores.clear();
+  decode_results->symbol_scores.clear();
+  decode_results->scores_table.resize(0, 0);
+
+  // Acquisition peaks summed over neighbouring symbol periods.
+  std::vector<float> filtered;
+  audio_dsp::BoxFilter2D(acquisition_scores_.View(0), frame_size_, params_.box_width,
+                         params_.num_symbol_periods_to_sum, /*allow_ragged=*/true, &filtered);
+  const float threshold =
+      params_.peak_threshold * params_.box_width * params_.num_symbol_periods_to_sum;
+  for (float& v : filtered) {
+    if (v < threshold) v = 0.0f;
+  }
+
+  // One peak per run of positive scores; peaks on a common grid form groups.
+  std::vector<DecodingGroup> groups;
+  const int size = static_cast<int>(filtered.size());
+  for (int i = 0; i < size;) {
+    if (filtered[i] <= 0.0f) {
+      ++i;
+      continue;
+    }
+    int peak = i;
+    for (; i < size && filtered[i] > 0.0f; ++i) {
+      if (filtered[i] > filtered[peak]) peak = i;
+    }
+    bool added = false;
+    for (DecodingGroup& group : groups) {
+      if (group.TryAdd(peak, filtered[peak])) {
+        added = true;
+        break;
+      }
+    }
+    if (!added) {
+      groups.emplace_back(peak, frame_size_, params_.max_gap, filtered[peak],
+                          params_.max_phase_error);
+    }
+  }
+
+  // Prefer groups that saw every slot of the token period.
+  const int period = token_selector_->symbol_period();
+  const DecodingGroup* chosen = nullptr;
+  for (bool need_all_slots : {true, false}) {
+    for (const DecodingGroup& group : groups) {
+      if (group.score() <= 0.0f) continue;
+      if (need_all_slots && !group.CoversAllSlots(period)) continue;
+      if (chosen == nullptr || group.score() > chosen->score()) chosen = &group;
+    }
+    if (chosen != nullptr) break;
+  }
+  if (chosen == nullptr) return false;
+
+  const int discarded = baseband_real_.num_discarded_samples();
+  FloatVector scores;
+  for (int t : chosen->times()) {
+    decode_results->detection_times.push_back((discarded + t) / baseband_rate_);
+    decode_results->detection_scores.push_back(filtered[t]);
+    if (!ComputeSymbolScores(RefinePeak(t), &scores)) continue;
+    const int slot = chosen->SlotOf(t);
+    auto [it, inserted] = decode_results->symbol_scores.try_emplace(slot, scores);
+    if (!inserted) it->second += scores;
+  }
+
+  token_selector_->SelectTokens(decode_results->symbol_scores, &decode_results->scores_table,
+                                &decode_results->tokens);
+  for (DecodedToken& token : decode_results->tokens) {
+    converter_->SymbolsToToken(token.symbols, &token.bytes);
+    token.position = chosen->IndexOfSlot(token.position);
+  }
+  return !decode_results->tokens.empty();
+}
+
+int SorvaneDecoder::RefinePeak(int t) const {
+  // Summing scores across symbol periods smears the peaks of a moving
+  // sender: the code drifts by up to max_speed / c of a frame per period,
+  // so the summed peak may sit several samples off the frame it stands for,
+  // and despreading fails beyond about half a chip. Re-centre on the raw
+  // scores of this period and its two neighbours, within the drift that
+  // the summed periods can account for.
+  const double drift = params_.max_speed / kSpeedOfSound * frame_size_;
+  const int radius =
+      static_cast<int>(std::ceil(drift * params_.num_symbol_periods_to_sum / 2.0));
+  if (radius < 1) return t;
+  const std::span<const float> raw = acquisition_scores_.View(0);
+  const int size = static_cast<int>(raw.size());
+  const auto local_sum = [&](int s) {
+    float sum = 0.0f;
+    for (int k = -1; k <= 1; ++k) {
+      const int i = s + k * frame_size_;
+      if (i >= 0 && i < size) sum += raw[i];
+    }
+    return sum;
+  };
+  int best = t;
+  float best_sum = local_sum(t);
+  for (int s = std::max(0, t - radius); s <= std::min(size - 1, t + radius); ++s) {
+    const float sum = local_sum(s);
+    if (sum > best_sum) {
+      best = s;
+      best_sum = sum;
+    }
+  }
+  return best;
+}
+
+bool SorvaneDecoder::ComputeSymbolScores(int t, FloatVector* symbol_scores) {
+  const int start = t - extension_;
+  if (start < 0 || start + extended_size_ > baseband_real_.size()) return false;
+  const int absolute = baseband_real_.num_discarded_samples() + t;
+  if (auto cached = symbol_score_cache_.find(absolute); cached != symbol_score_cache_.end()) {
+    *symbol_scores = cached->second;
+    return true;
+  }
+  CHECK(symbol_scores);
+  const int extended_size = extended_size_;
+  const std::span<const float> baseband_real_extended_frame =
+      baseband_real_.View(start).first(extended_size);
+  const std::span<const float> baseband_imaginary_extended_frame =
+      baseband_imaginary_.View(start).first(extended_size);
+  CHECK_EQ(baseband_real_extended_frame.size(), extended_size);
+  CHECK_EQ(baseband_imaginary_extended_frame.size(), extended_size);
+
+  // Despread, then find the Doppler offset from windowed phase blocks.
+  std::vector<std::complex<float>> z(extended_size);
+  for (int i = 0; i < extended_size; ++i) {
+    z[i] = std::complex<float>(baseband_real_extended_frame[i],
+                               baseband_imaginary_extended_frame[i]) *
+           extended_code_[i];
+  }
+  const int num_blocks = extended_size / phase_block_size_;
+  ComplexVector blocks = ComplexVector::Zero(num_blocks);
+  for (int i = 0; i < num_blocks * phase_block_size_; ++i) {
+    blocks[i / phase_block_size_] += z[i] * extended_window_[i];
+  }
+  blocks /= static_cast<float>(phase_block_size_);
+  const float f = symbol_frequencies_[MaxFilterResponse(symbol_phasors_, blocks).index];
+
+  // Remove the Doppler rotation and the carrier phase from the symbol frame.
+  const int frame = frame_size_;
+  std::vector<std::complex<float>> corrected(frame);
+  std::complex<double> sum;
+  const double step = -2.0 * std::numbers::pi * f / frame;
+  const std::complex<double> rotation(std::cos(step), std::sin(step));
+  std::complex<double> phasor(1.0, 0.0);
+  for (int k = 0; k < frame; ++k) {
+    corrected[k] = z[extension_ + k] * std::complex<float>(phasor);
+    sum += std::complex<double>(corrected[k]);
+    phasor *= rotation;
+  }
+  double phi = std::atan2(sum.imag(), sum.real());
+  if (coder_->params().use_quadrature) phi += std::numbers::pi / 2;
+  const std::complex<float> derotate(static_cast<float>(std::cos(-phi)),
+                                     static_cast<float>(std::sin(-phi)));
+  FloatVector real_part(frame);
+  for (int k = 0; k < frame; ++k) real_part[k] = (corrected[k] * derotate).real();
+  *symbol_scores = coder_->baseband_tones() * real_part;
+  symbol_score_cache_.emplace(absolute, *symbol_scores);
+  return true;
+}
+
+}  // namespace audio_sorvane

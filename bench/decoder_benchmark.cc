@@ -1,0 +1,70 @@
+// Receive side: real-time factor of the DSSS decoder (10 ms blocks of
+// 44.1 kHz mono, GetToken every 250 ms; items are input samples, so
+// items_per_second / 44100 is the real-time factor) and the heap one
+// decoder holds after 60 s of streaming.
+#include <malloc.h>
+
+#include <cstdint>
+#include <memory>
+#include <vector>
+
+#include "audio/modem_config.h"
+#include "audio/sorvane/sorvane_decoder.h"
+#include "benchmark/benchmark.h"
+#include "sim/channel_simulator.h"
+
+namespace {
+
+using audio_sorvane::SorvaneDecoder;
+
+std::vector<float> ReceivedBroadcast(double seconds, double snr_db) {
+  const auto encoder = audio_sorvane::MakeDsssEncoder({});
+  std::vector<float> token;
+  encoder->Encode({0x53, 0x6f, 0x72, 0x76, 0x65, 0x6c}, &token, 2);
+  sorvel_sim::ChannelConfig channel;
+  channel.snr_db = snr_db;
+  return sorvel_sim::ApplyChannel(sorvel_sim::RenderLoopedBroadcast(*encoder, token, seconds),
+                                  channel);
+}
+
+std::unique_ptr<SorvaneDecoder> MakeDecoder() {
+  auto decoder = std::make_unique<SorvaneDecoder>(
+      std::make_shared<const audio_sorvane::SymbolWaveCoder>(
+          audio_sorvane::MakeSymbolWaveCoderParams({})),
+      audio_sorvane::SorvaneDecoderParams());
+  decoder->Initialize(1, 44100.0f);
+  return decoder;
+}
+
+// Feeds `signal` in 10 ms blocks with GetToken every 25 blocks.
+void Stream(SorvaneDecoder& decoder, const std::vector<float>& signal) {
+  audio_sorvane::DecodeResults results;
+  for (size_t start = 0, n = 0; start + 441 <= signal.size(); start += 441, ++n) {
+    decoder.ProcessSamples(std::span<const float>(signal).subspan(start, 441));
+    if (n % 25 == 24) benchmark::DoNotOptimize(decoder.GetToken(&results));
+  }
+}
+
+void BM_DsssDecoderRealTime(benchmark::State& state) {
+  const std::vector<float> signal = ReceivedBroadcast(10.0, -10.0);
+  auto decoder = MakeDecoder();
+  for (auto _ : state) Stream(*decoder, signal);
+  state.SetItemsProcessed(state.iterations() * static_cast<int64_t>(signal.size()));
+  state.counters["x_real_time"] = benchmark::Counter(
+      static_cast<double>(signal.size()) / 44100.0, benchmark::Counter::kIsIterationInvariantRate);
+}
+BENCHMARK(BM_DsssDecoderRealTime)->Unit(benchmark::kMillisecond);
+
+// Heap held by one decoder (construction included) after 60 s of input.
+void BM_DsssDecoderMemory(benchmark::State& state) {
+  const std::vector<float> signal = ReceivedBroadcast(10.0, -10.0);
+  for (auto _ : state) {
+    const size_t before = mallinfo2().uordblks;
+    auto decoder = MakeDecoder();
+    for (int i = 0; i < 6; ++i) Stream(*decoder, signal);
+    state.counters["heap_bytes"] = static_cast<double>(mallinfo2().uordblks - before);
+  }
+}
+BENCHMARK(BM_DsssDecoderMemory)->Iterations(1)->Unit(benchmark::kMillisecond);
+
+}  // namespace
