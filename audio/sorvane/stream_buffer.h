@@ -1,13 +1,13 @@
-// A growable sample buffer that remembers how many samples it has dropped
+// A growable sample buffer that remembers how many samples have been dropped
 // from its front, so that an index into it maps to an absolute sample number
 // of the stream: sample i of the buffer is stream sample
 // num_discarded_samples() + i.
 //
 // Discard moves the start of the held samples forward and compacts the
-// vector (elements move down) once the dead prefix exceeds a quarter of the
-// live samples, so a receiver that discards a little per block moves each
-// sample a few times, not once per discard. Not thread safe.
-// Out-of-range discards and negative offsets end the process through CHECK.
+// storage (elements move down) once the dead prefix exceeds a quarter of the
+// held samples, so a receiver that discards a little per block moves each
+// sample a few times, not once per discard. Not thread safe. Out-of-range
+// discards and negative offsets end the process through CHECK.
 #ifndef AUDIO_SORVANE_STREAM_BUFFER_H_
 #define AUDIO_SORVANE_STREAM_BUFFER_H_
 
@@ -25,18 +25,19 @@ class StreamBuffer {
 
   // Adds samples at the back.
   void Append(std::span<const float> samples) {
-    buffer_.insert(buffer_.end(), samples.begin(), samples.end());
+    buffer_.storage.insert(buffer_.storage.end(), samples.begin(), samples.end());
   }
 
   // Removes the first `num_samples` samples.
   void Discard(int num_samples) {
     CHECK(num_samples >= 0);
-    CHECK(num_samples <= size());
-    start_ += num_samples;
+    CHECK(num_samples <= static_cast<int>(buffer_.size()));
+    buffer_.start += num_samples;
     num_discarded_samples_ += num_samples;
-    if (start_ > size() / 4) {
-      buffer_.erase(buffer_.begin(), buffer_.begin() + start_);
-      start_ = 0;
+    if (buffer_.start > buffer_.size() / 4) {
+      buffer_.storage.erase(buffer_.storage.begin(),
+                            buffer_.storage.begin() + static_cast<ptrdiff_t>(buffer_.start));
+      buffer_.start = 0;
     }
   }
 
@@ -45,27 +46,38 @@ class StreamBuffer {
   std::span<const float> View(int offset) const {
     CHECK(offset >= 0);
     if (offset >= size()) return {};
-    return std::span<const float>(buffer_).subspan(start_ + offset);
+    return {buffer_.data() + offset, buffer_.size() - offset};
   }
 
   // Drops every sample and resets the stream position to 0.
   void Clear() {
-    buffer_.clear();
-    start_ = 0;
+    buffer_.storage.clear();
+    buffer_.start = 0;
     num_discarded_samples_ = 0;
   }
 
   // Overwrites every held sample with 0, keeping the length and position.
-  void Zero() { std::fill(buffer_.begin() + start_, buffer_.end(), 0.0f); }
+  void Zero() {
+    std::fill(buffer_.storage.begin() + static_cast<ptrdiff_t>(buffer_.start),
+              buffer_.storage.end(), 0.0f);
+  }
 
-  int size() const { return static_cast<int>(buffer_.size()) - start_; }
+  int size() const { return static_cast<int>(buffer_.size()); }
   int num_discarded_samples() const { return num_discarded_samples_; }
   // Capacity in samples, for memory accounting.
-  int capacity() const { return static_cast<int>(buffer_.capacity()); }
+  int capacity() const { return static_cast<int>(buffer_.storage.capacity()); }
 
  private:
-  std::vector<float> buffer_;
-  int start_ = 0;  // index in buffer_ of the first held sample
+  // The held samples are storage[start ...]; the dead prefix before start is
+  // dropped once it outgrows a quarter of them.
+  struct Samples {
+    std::vector<float> storage;
+    size_t start = 0;
+    size_t size() const { return storage.size() - start; }
+    const float* data() const { return storage.data() + start; }
+  };
+
+  Samples buffer_;
   int num_discarded_samples_ = 0;
 };
 
