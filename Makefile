@@ -26,6 +26,7 @@ demo: build
 
 bench: build
 	@$(BUILD_DIR)/bench/sorvel_benchmarks
+	@$(BUILD_DIR)/bench/sorvel_link_quality --seeds 20
 
 clean:
 	@rm -rf $(BUILD_DIR) out
