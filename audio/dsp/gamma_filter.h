@@ -42,6 +42,8 @@ class GammaFilter {
 
   // Zeroes every stage.
   void Reset() { states_.assign(states_.size(), 0.0f); }
+  // Sets every stage to `value`, as if that value had been the input forever.
+  void SetState(float value) { states_.assign(states_.size(), value); }
 
   double sample_rate() const { return sample_rate_; }
   int order() const { return order_; }

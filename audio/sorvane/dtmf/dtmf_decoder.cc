@@ -1,0 +1,293 @@
+#include "audio/sorvane/dtmf/dtmf_decoder.h"
+
+#include <algorithm>
+#include <cmath>
+#include <complex>
+#include <numbers>
+
+#include "audio/dsp/gamma_filter.h"
+#include "audio/dsp/max_filter.h"
+#include "audio/dsp/number_util.h"
+#include "audio/dsp/resampler.h"
+#include "audio/sorvane/compute_buffer_truncation.h"
+#include "base/logging.h"
+
+namespace audio_sorvane {
+namespace {
+
+constexpr double kSpeedOfSound = 340.0;  // m/s
+
+TokenSelectorParams SelectorParams(const DtmfDecoderParams& params, int symbols_in_token) {
+  TokenSelectorParams selector;
+  selector.alphabet_size = static_cast<int>(params.symbol_table.size());
+  selector.spacer = params.spacer_symbol;
+  selector.symbols_in_token = symbols_in_token;
+  selector.append_check_symbol = params.use_checksum_symbol;
+  selector.max_candidates_rank = params.max_candidates_rank;
+  selector.max_candidates_to_return = params.max_candidates_per_decode_token_call;
+  selector.token_threshold_factor = params.token_threshold_factor;
+  return selector;
+}
+
+}  // namespace
+
+DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
+    : params_(params),
+      converter_(static_cast<int>(params.symbol_table.size()), params.spacer_symbol,
+                 params.bytes_in_token),
+      token_selector_(std::make_unique<TokenSelector>(
+          SelectorParams(params, converter_.symbols_in_token()))) {
+  CheckDtmfEncoderParams(params);
+  CHECK(params.max_meters_per_second >= 0.0);
+  CHECK(params.max_buffer_duration_in_seconds > 0.0);
+  CHECK(params.tone_normalization_params.window_size >= 0.0);
+  CHECK(params.tone_normalization_params.cross_frequency_weight >= 0.0);
+  CHECK(params.tone_normalization_params.division_floor >= 0.0);
+  CHECK(params.noise_estimate_filter_order > 0);
+  CHECK(params.noise_estimate_filter_stddev > 0.0);
+  CHECK(params.acquisition_threshold >= 0.0);
+  CHECK(params.max_candidates_rank > 0);
+  CHECK(params.max_candidates_per_decode_token_call > 0);
+  CHECK(params.token_threshold_factor >= 0);
+
+  num_frequencies_ = static_cast<int>(params_.tone_frequencies.size());
+  frame_size_ = FrameSize(params_);
+  baseband_frame_size_ = frame_size_ / params_.baseband_decimation_factor;
+  frame_duration_ = static_cast<float>(frame_size_) / params_.sample_rate;
+  baseband_sample_rate_ =
+      params_.sample_rate / static_cast<float>(params_.baseband_decimation_factor);
+
+  // Tone filter bandwidth: the largest Doppler shift plus the bandwidth of
+  // one symbol frame.
+  const float highest = *std::max_element(params_.tone_frequencies.begin(),
+                                          params_.tone_frequencies.end());
+  const double cutoff = static_cast<double>(highest * params_.max_meters_per_second) /
+                            kSpeedOfSound +
+                        0.594 / frame_duration_;
+  for (float tone : params_.tone_frequencies) {
+    tone_strength_filters_.emplace_back(params_.baseband_decimation_factor,
+                                        params_.sample_rate, tone, cutoff);
+  }
+  tone_strength_buffers_.resize(num_frequencies_);
+}
+
+void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
+  CHECK(received_sample_rate > 0.0);
+  CHECK(num_channels >= 1);
+  received_sample_rate_ = received_sample_rate;
+  num_channels_ = num_channels;
+  received_per_baseband_ = received_sample_rate_ / baseband_sample_rate_;
+  const int frames = converter_.symbols_in_token() + (params_.use_checksum_symbol ? 1 : 0) + 1;
+  max_good_block_size_ =
+      static_cast<int>(std::lround(frame_duration_ * received_sample_rate_ * frames));
+  max_buffer_size_ = static_cast<int>(
+      std::lround(params_.max_buffer_duration_in_seconds * received_sample_rate_));
+  if (received_sample_rate_ == params_.sample_rate) {
+    received_resampler_.reset();
+  } else {
+    received_resampler_ = std::make_unique<audio_dsp::RationalFactorResampler<float>>(
+        audio_dsp::DefaultResamplingKernel(received_sample_rate_, params_.sample_rate), 2000);
+    CHECK(received_resampler_->Valid()) << "Failed to initialize RationalFactorResampler.";
+  }
+  tone_strength_buffer_size_ = 0;
+  for (ToneStrengthFilter& filter : tone_strength_filters_) filter.Reset();
+  for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Clear();
+  initialized_ = true;
+}
+
+void DtmfDecoder::Reset() {
+  for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Clear();
+  Init(num_channels_, received_sample_rate_);
+}
+
+int DtmfDecoder::GetMaxSafeInputSize() const {
+  if (!initialized_) return 0;
+  return std::max(0, max_buffer_size_ - max_good_block_size_) * num_channels_;
+}
+
+void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
+  if (!initialized_) {
+    LOG(ERROR) << "ProcessSamples() called before call to Init().";
+    return;
+  }
+  if (received_samples.empty()) return;
+  const int frames = static_cast<int>(received_samples.size()) / num_channels_;
+  const int buffered = static_cast<int>(
+      std::ceil(received_per_baseband_ * (tone_strength_buffer_size_ + 1)));
+  const BufferTruncation truncation =
+      ComputeBufferTruncation(frames, buffered, max_good_block_size_, max_buffer_size_);
+  const int skip_samples = truncation.skip * num_channels_;
+  const int drop_baseband =
+      static_cast<int>(std::ceil(truncation.drop / received_per_baseband_));
+  if (skip_samples >= 1) {
+    Init(num_channels_, received_sample_rate_);
+    ProcessSamples(received_samples.subspan(
+        std::min<size_t>(static_cast<size_t>(skip_samples), received_samples.size())));
+    return;
+  }
+  if (drop_baseband >= 1) {
+    // Whole symbol periods, so the symbol phase of the buffers is kept.
+    const int drop = std::min(audio_dsp::RoundUpToMultiple(drop_baseband, baseband_frame_size_),
+                              tone_strength_buffer_size_);
+    for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Discard(drop);
+    tone_strength_buffer_size_ -= drop;
+  }
+
+  std::span<const float> mono = received_samples;
+  if (num_channels_ > 1) {
+    CHECK(received_samples.size() % num_channels_ == 0);
+    mono_.assign(received_samples.size() / num_channels_, 0.0f);
+    for (size_t i = 0; i < mono_.size(); ++i) {
+      float sum = 0.0f;
+      for (int c = 0; c < num_channels_; ++c) sum += received_samples[i * num_channels_ + c];
+      mono_[i] = sum / static_cast<float>(num_channels_);
+    }
+    mono = mono_;
+  }
+  if (received_resampler_) {
+    received_resampler_->ProcessSamples(mono, &resampled_);
+    mono = resampled_;
+  }
+  int added = 0;
+  for (int i = 0; i < num_frequencies_; ++i) {
+    tone_strength_filters_[i].ProcessSamples(mono, &strengths_);
+    tone_strength_buffers_[i].Append(strengths_);
+    if (i == 0) added = static_cast<int>(strengths_.size());
+    CHECK_EQ(tone_strength_buffers_[i].size(), tone_strength_buffer_size_ + added);
+  }
+  tone_strength_buffer_size_ += added;
+}
+
+// Delay-compensated gamma smoothing: the filter's delay d is removed by
+// priming its stages with the mean of the first d inputs, dropping the first
+// d outputs and flushing with the mean of the last d inputs, so that the
+// smoothed value at i describes the noise around i, not d samples earlier.
+void DtmfDecoder::SmoothNoise(std::vector<float>* noise) const {
+  std::vector<float>& x = *noise;
+  const int length = static_cast<int>(x.size());
+  if (length == 0) return;
+  const int order = params_.noise_estimate_filter_order;
+  const double pole = audio_dsp::GammaFilterPoleFromStddev(
+      params_.noise_estimate_filter_stddev * baseband_frame_size_, order);
+  const int d = audio_dsp::GammaFilterDelay(order, pole);
+  const auto mean = [&](int begin, int end) {
+    double sum = 0.0;
+    for (int i = begin; i < end; ++i) sum += x[i];
+    return static_cast<float>(sum / (end - begin));
+  };
+  if (length <= d) {
+    std::fill(x.begin(), x.end(), mean(0, length));
+    return;
+  }
+  const float head = d > 0 ? mean(0, d) : x[0];
+  const float tail = d > 0 ? mean(length - d, length) : x[length - 1];
+  audio_dsp::GammaFilter filter(order, baseband_sample_rate_, pole);
+  filter.SetState(head);
+  for (int i = 0; i < d; ++i) filter.ProcessSample(x[i]);
+  for (int i = d; i < length; ++i) x[i - d] = filter.ProcessSample(x[i]);
+  for (int i = length - d; i < length; ++i) x[i] = filter.ProcessSample(tail);
+}
+
+bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
+  if (!initialized_) {
+    LOG(ERROR) << "GetToken() called before call to Init().";
+    return false;
+  }
+  CHECK(decode_results);
+  decode_results->tokens.clear();
+  decode_results->detection_times.clear();
+  decode_results->detection_scores.clear();
+  decode_results->symbol_scores.clear();
+  decode_results->scores_table.resize(0, 0);
+  const int length = tone_strength_buffer_size_;
+  if (length == 0) return false;
+
+  // Tone strengths over their local level, partly levelled across tones.
+  const ToneNormalizationParams& norm = params_.tone_normalization_params;
+  const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
+  audio_dsp::FloatMatrix local(num_frequencies_, length);
+  std::vector<float> row(length);
+  for (int i = 0; i < num_frequencies_; ++i) {
+    audio_dsp::MaxFilter(tone_strength_buffers_[i].View(0).data(), length, window, row.data());
+    local.row(i) = Eigen::Map<const audio_dsp::FloatVector>(row.data(), length).transpose();
+  }
+  std::vector<const float*> raw(num_frequencies_);
+  for (int i = 0; i < num_frequencies_; ++i) raw[i] = tone_strength_buffers_[i].View(0).data();
+  audio_dsp::FloatMatrix tone_scores(num_frequencies_, length);
+  for (int t = 0; t < length; ++t) {
+    const float strongest = local.col(t).maxCoeff();
+    for (int i = 0; i < num_frequencies_; ++i) {
+      const float level = local(i, t) + norm.cross_frequency_weight * (strongest - local(i, t)) +
+                          norm.division_floor;
+      tone_scores(i, t) = raw[i][t] / level;
+    }
+  }
+
+  // Acquisition: the weakest of the strongest tones_per_symbol tones over
+  // the smoothed mean of the others.
+  CHECK(tone_scores.rows() == num_frequencies_);
+  CHECK(tone_scores.cols() == tone_strength_buffer_size_);
+  const int k = num_frequencies_ - params_.tones_per_symbol;
+  std::vector<float> signal(length), noise(length), column(num_frequencies_);
+  for (int t = 0; t < length; ++t) {
+    for (int i = 0; i < num_frequencies_; ++i) column[i] = tone_scores(i, t);
+    std::nth_element(column.begin(), column.begin() + k, column.end());
+    signal[t] = column[k];
+    float sum = 0.0f;
+    for (int j = 0; j < k; ++j) sum += column[j];
+    noise[t] = k > 0 ? sum / static_cast<float>(k) : 0.0f;
+  }
+  SmoothNoise(&noise);
+  std::vector<float> acquisition_scores(length);
+  for (int t = 0; t < length; ++t) acquisition_scores[t] = signal[t] / (1e-12f + noise[t]);
+
+  // Symbol timing: the phase of the acquisition folded over whole periods.
+  const int period = baseband_frame_size_;
+  std::vector<double> folded(period, 0.0);
+  for (int p = 0; p < (length / period) * period; ++p) folded[p % period] += acquisition_scores[p];
+  const std::complex<double> step = std::polar(1.0, 2.0 * std::numbers::pi / period);
+  std::complex<double> phasor(1.0, 0.0), sum;
+  for (int p = 0; p < period; ++p) {
+    sum += folded[p] * phasor;
+    phasor *= step;
+  }
+  const double angle = std::atan2(sum.imag(), sum.real());
+  const int t0 = audio_dsp::PositiveModulo(
+      static_cast<int>(std::lround(angle * period / (2.0 * std::numbers::pi))), period);
+
+  // Per-symbol scores at every symbol-spaced time with enough acquisition.
+  CHECK(acquisition_scores.size() == static_cast<size_t>(tone_strength_buffer_size_));
+  const int alphabet = static_cast<int>(params_.symbol_table.size());
+  const float discarded_seconds =
+      static_cast<float>(tone_strength_buffers_[0].num_discarded_samples()) / baseband_sample_rate_;
+  for (int slot = 0, t = t0; t < length; ++slot, t += period) {
+    float score = acquisition_scores[t];
+    if (t > period && t + period < length) {
+      score = std::max(score, std::min(acquisition_scores[t - period],
+                                       acquisition_scores[t + period]));
+    }
+    if (score < params_.acquisition_threshold) continue;
+    audio_dsp::FloatVector symbol_scores(alphabet);
+    for (int s = 0; s < alphabet; ++s) {
+      float weakest = INFINITY;
+      for (int tone : params_.symbol_table[s]) weakest = std::min(weakest, tone_scores(tone, t));
+      symbol_scores[s] = weakest;
+    }
+    decode_results->symbol_scores.emplace(slot, std::move(symbol_scores));
+    decode_results->detection_times.push_back(discarded_seconds + t / baseband_sample_rate_);
+    decode_results->detection_scores.push_back(score);
+  }
+
+  std::vector<DecodedToken> candidates;
+  token_selector_->SelectTokens(decode_results->symbol_scores, &decode_results->scores_table,
+                                &candidates);
+  for (DecodedToken& candidate : candidates) {
+    candidate.bytes = converter_.SymbolsToBytes(candidate.symbols);
+    if (static_cast<int>(candidate.bytes.size()) == params_.bytes_in_token) {
+      decode_results->tokens.push_back(std::move(candidate));
+    }
+  }
+  return !decode_results->tokens.empty();
+}
+
+}  // namespace audio_sorvane

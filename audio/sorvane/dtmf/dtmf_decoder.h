@@ -1,0 +1,123 @@
+// The multi-tone receiver.
+//
+// Received audio (any rate and channel count) is mixed to mono, resampled to
+// the encoder's rate and run through one ToneStrengthFilter per tone; the
+// filter outputs (one per baseband sample) are kept in rolling buffers. On a
+// token request the tone strengths are normalised by their local level,
+// an acquisition score (weakest of the strongest tones_per_symbol tones over
+// the smoothed mean of the others) finds the symbol timing, and per-symbol
+// scores at every symbol-spaced time with enough acquisition go to the token
+// selector.
+//
+// Not thread safe: one caller thread per decoder. Calls before Init are
+// logged errors that do nothing; parameter and shape faults end the process
+// through CHECK.
+#ifndef AUDIO_SORVANE_DTMF_DTMF_DECODER_H_
+#define AUDIO_SORVANE_DTMF_DTMF_DECODER_H_
+
+#include <memory>
+#include <span>
+#include <vector>
+
+#include "audio/dsp/rational_factor_resampler.h"
+#include "audio/sorvane/dtmf/byte_symbol_converter.h"
+#include "audio/sorvane/dtmf/dtmf_encoder_params.h"
+#include "audio/sorvane/dtmf/tone_strength_filter.h"
+#include "audio/sorvane/sorvane_decoder.h"
+#include "audio/sorvane/stream_buffer.h"
+#include "audio/sorvane/token_selector.h"
+
+namespace audio_sorvane {
+
+struct ToneNormalizationParams {
+  // Width of the local-level window, in symbol frames. Four frames span the
+  // two tones of a symbol and the neighbours that share one of them, so a
+  // tone is compared with its own recent level rather than the whole burst.
+  float window_size = 4.0f;
+  // Share of the strongest tone's level in each tone's normaliser. Half
+  // keeps a weak tone (a quiet low note through a phone speaker) from being
+  // blown up while still levelling the tones against each other.
+  float cross_frequency_weight = 0.5f;
+  // Added to every normaliser (squared 16-bit units): keeps digital silence
+  // at 0 instead of 0 / 0, far below any audible tone.
+  float division_floor = 1.0f;
+};
+
+// The tone parameters shared with the encoder, then the receiver's own.
+struct DtmfDecoderParams : DtmfEncoderParams {
+  DtmfDecoderParams() = default;
+  explicit DtmfDecoderParams(const DtmfEncoderParams& tones) : DtmfEncoderParams(tones) {}
+
+  // Widens the tone filters by the Doppler shift of the highest tone at this
+  // speed (m/s); 1 m/s is a hand moving a phone.
+  float max_meters_per_second = 1.0f;
+  // Received signal the buffers may hold, seconds (> 0). The app sets a
+  // multiple of the token duration.
+  float max_buffer_duration_in_seconds = 3.0f;
+  ToneNormalizationParams tone_normalization_params;
+  // Noise smoother: a 4-stage gamma filter spreading over 8 symbol frames is
+  // smooth enough to ignore single symbols yet follows a noise change
+  // within a token.
+  int noise_estimate_filter_order = 4;
+  float noise_estimate_filter_stddev = 8.0f;
+  // A slot counts as a symbol when its tones stand twice above the noise.
+  float acquisition_threshold = 2.0f;
+  int max_candidates_rank = 6;
+  int max_candidates_per_decode_token_call = 2;
+  float token_threshold_factor = 1.0f / 3.0f;
+};
+
+class DtmfDecoder {
+ public:
+  explicit DtmfDecoder(const DtmfDecoderParams& params);
+
+  // Must come before any audio; may be called again to restart.
+  void Init(int num_channels, float received_sample_rate);
+  // Empties the buffers and restarts with the same format.
+  void Reset();
+  // Appends interleaved samples (any scale).
+  void ProcessSamples(std::span<const float> received_samples);
+  // Candidates of the right length (bytes filled, position = slot of the
+  // spacer) into decode_results, with the selector's scores table and the
+  // recorded slots' times and acquisition scores as diagnostics. True if
+  // any candidate was found.
+  bool GetToken(DecodeResults* decode_results);
+  // The largest block (samples, channels interleaved) one call can take
+  // without cutting into a token held in the buffer; 0 before Init.
+  int GetMaxSafeInputSize() const;
+
+  const DtmfDecoderParams& params() const { return params_; }
+  bool uses_resampler() const { return received_resampler_ != nullptr; }
+  int tone_strength_buffer_size() const { return tone_strength_buffer_size_; }
+  int symbols_in_token() const { return converter_.symbols_in_token(); }
+  int baseband_frame_size() const { return baseband_frame_size_; }
+
+ private:
+  // Aligns the gamma-smoothed sequence with its input (see the .cc).
+  void SmoothNoise(std::vector<float>* noise) const;
+
+  DtmfDecoderParams params_;
+  ByteSymbolConverter converter_;
+  std::unique_ptr<TokenSelector> token_selector_;
+  int num_frequencies_ = 0;
+  int frame_size_ = 0;
+  int baseband_frame_size_ = 0;
+  float frame_duration_ = 0.0f;
+  float baseband_sample_rate_ = 0.0f;
+  float received_sample_rate_ = 0.0f;
+  int num_channels_ = 1;
+  float received_per_baseband_ = 1.0f;
+  int max_good_block_size_ = 0;
+  int max_buffer_size_ = 0;
+  std::unique_ptr<audio_dsp::RationalFactorResampler<float>> received_resampler_;
+  std::vector<ToneStrengthFilter> tone_strength_filters_;
+  std::vector<StreamBuffer> tone_strength_buffers_;
+  int tone_strength_buffer_size_ = 0;
+  bool initialized_ = false;
+
+  std::vector<float> mono_, resampled_, strengths_;  // scratch
+};
+
+}  // namespace audio_sorvane
+
+#endif  // AUDIO_SORVANE_DTMF_DTMF_DECODER_H_
