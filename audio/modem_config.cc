@@ -142,4 +142,45 @@ std::unique_ptr<AudioModemEncoder> MakeDtmfEncoder(const DtmfConfig& config) {
   return std::make_unique<AudioModemEncoder>(std::make_unique<DtmfEncoder>(params));
 }
 
+std::unique_ptr<AudioModemDecoder> MakeDsssDecoder(const DsssDecoderConfig& config) {
+  auto coder = std::make_shared<const SymbolWaveCoder>(MakeSymbolWaveCoderParams(config.coder));
+  SorvaneDecoderParams params;
+  params.symbols_in_token =
+      DsssSymbolsPerToken(config.coder.bits_per_symbol, config.token_length_bytes);
+  params.append_check_symbol = config.append_check_symbol;
+  params.save_received_samples = config.save_received_samples;
+  params.max_candidates_to_return = config.max_candidates_to_return;
+  params.detection_duration = config.detection_duration;
+  params.detection_threshold = config.detection_threshold;
+  const float token_seconds =
+      static_cast<float>((params.symbols_in_token + (config.append_check_symbol ? 2 : 1)) *
+                         coder->samples_per_frame()) /
+      config.coder.sample_rate;
+  params.buffer_duration = token_seconds * config.buffer_duration_factor;
+  auto dsss = std::make_unique<SorvaneDecoder>(std::move(coder), params);
+  std::unique_ptr<AudioModemDecoder> decoder;
+  if (config.with_hotsound) {
+    decoder = std::make_unique<AudioModemDecoder>(std::make_unique<HotsoundDecoder>(
+        std::move(dsss), MakeHotsoundDetector(static_cast<int>(config.input_sample_rate),
+                                              config.num_channels)));
+  } else {
+    decoder = std::make_unique<AudioModemDecoder>(std::move(dsss));
+  }
+  decoder->Initialize(config.num_channels, config.input_sample_rate);
+  return decoder;
+}
+
+std::unique_ptr<AudioModemDecoder> MakeDtmfDecoder(const DtmfDecoderConfig& config) {
+  DtmfEncoderParams tones;
+  if (!MakeDtmfEncoderParams(config.tones, &tones)) return nullptr;
+  DtmfDecoderParams params(tones);
+  params.max_candidates_per_decode_token_call = config.max_candidates_per_decode_token_call;
+  params.max_buffer_duration_in_seconds =
+      TokenDurationSeconds(tones) * config.buffer_duration_factor;
+  auto decoder =
+      std::make_unique<AudioModemDecoder>(std::make_unique<DtmfDecoder>(params));
+  decoder->Initialize(config.num_channels, config.input_sample_rate);
+  return decoder;
+}
+
 }  // namespace audio_sorvane

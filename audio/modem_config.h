@@ -12,6 +12,7 @@
 #include <string>
 #include <vector>
 
+#include "audio/audio_modem_decoder.h"
 #include "audio/audio_modem_encoder.h"
 #include "audio/sorvane/dtmf/dtmf_encoder_params.h"
 #include "audio/sorvane/symbol_wave_coder.h"
@@ -74,9 +75,39 @@ bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params);
 std::string ValidateDsssCoderConfig(const DsssCoderConfig& config);
 std::string ValidateDtmfConfig(const DtmfConfig& config);
 
+// The receiving side. The decoders hold a few tokens' worth of audio:
+// buffer_duration_factor times one token's duration.
+struct DsssDecoderConfig {
+  DsssCoderConfig coder;
+  int token_length_bytes = 8;
+  bool append_check_symbol = false;
+  bool save_received_samples = false;
+  int max_candidates_to_return = 2;
+  int num_channels = 1;
+  bool with_hotsound = false;
+  float detection_duration = 0.175f;
+  float detection_threshold = 4.0f;
+  float input_sample_rate = 44100.0f;
+  float buffer_duration_factor = 4.0f;  // about 3 s with the defaults
+};
+
+struct DtmfDecoderConfig {
+  DtmfConfig tones;
+  int max_candidates_per_decode_token_call = 2;
+  int num_channels = 1;
+  float input_sample_rate = 44100.0f;
+  float buffer_duration_factor = 6.0f;  // about 2.7 s with the defaults
+};
+
 std::unique_ptr<AudioModemEncoder> MakeDsssEncoder(const DsssEncoderConfig& config);
 // Null when the ADSR window is refused.
 std::unique_ptr<AudioModemEncoder> MakeDtmfEncoder(const DtmfConfig& config);
+
+// Initialised decoders (Initialize already called with the channel count
+// and input rate). The multi-tone one is null when the ADSR window is
+// refused.
+std::unique_ptr<AudioModemDecoder> MakeDsssDecoder(const DsssDecoderConfig& config);
+std::unique_ptr<AudioModemDecoder> MakeDtmfDecoder(const DtmfDecoderConfig& config);
 
 }  // namespace audio_sorvane
 

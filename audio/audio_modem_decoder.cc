@@ -1,0 +1,168 @@
+#include "audio/audio_modem_decoder.h"
+
+#include <algorithm>
+#include <cmath>
+#include <utility>
+
+#include "audio/sorvane/crc16_coder.h"
+#include "base/logging.h"
+
+namespace audio_sorvane {
+
+AudioModemDecoder::AudioModemDecoder(std::unique_ptr<SorvaneDecoder> dsss_decoder)
+    : kind_(kDsss) {
+  CHECK(dsss_decoder);
+  dsss_decoder_ = std::move(dsss_decoder);
+  token_length_bytes_ = dsss_decoder_->symbol_wave_coder().params().bits_per_symbol *
+                        dsss_decoder_->params().symbols_in_token / 8;
+}
+
+AudioModemDecoder::AudioModemDecoder(std::unique_ptr<HotsoundDecoder> hotsound_decoder)
+    : kind_(kHotsound) {
+  CHECK(hotsound_decoder);
+  hotsound_decoder_ = std::move(hotsound_decoder);
+  token_length_bytes_ = hotsound_decoder_->token_length_bytes();
+}
+
+AudioModemDecoder::AudioModemDecoder(std::unique_ptr<DtmfDecoder> dtmf_decoder)
+    : kind_(kDtmf) {
+  CHECK(dtmf_decoder);
+  dtmf_decoder_ = std::move(dtmf_decoder);
+  token_length_bytes_ = dtmf_decoder_->params().bytes_in_token;
+}
+
+void AudioModemDecoder::Initialize(int num_channels, float input_sample_rate) {
+  switch (kind_) {
+    case kDsss:
+      dsss_decoder_->Initialize(num_channels, input_sample_rate);
+      break;
+    case kHotsound:
+      hotsound_decoder_->Initialize(num_channels, input_sample_rate);
+      break;
+    case kDtmf:
+      dtmf_decoder_->Init(num_channels, input_sample_rate);
+      break;
+  }
+}
+
+void AudioModemDecoder::ProcessSamples(std::span<const float> samples) {
+  switch (kind_) {
+    case kDsss:
+      dsss_decoder_->ProcessSamples(samples);
+      break;
+    case kDtmf:
+      dtmf_decoder_->ProcessSamples(samples);
+      break;
+    case kHotsound:
+      int16_samples_.resize(samples.size());
+      for (size_t i = 0; i < samples.size(); ++i) {
+        int16_samples_[i] = static_cast<int16_t>(
+            std::clamp(std::trunc(samples[i]), -32768.0f, 32767.0f));
+      }
+      hotsound_decoder_->ProcessSamples(int16_samples_.data(),
+                                        static_cast<int>(int16_samples_.size()));
+      break;
+  }
+}
+
+void AudioModemDecoder::ProcessSamplesInt16(const int16_t* samples, int count) {
+  if (kind_ == kHotsound) hotsound_decoder_->ProcessSamples(samples, count);
+}
+
+bool AudioModemDecoder::DecodeTokens(DecodeResults* decode_results, int num_message_bytes,
+                                     int num_crc_check_bytes) {
+  CHECK(decode_results);
+  if (num_message_bytes + num_crc_check_bytes != token_length_bytes_) {
+    LOG(ERROR) << "num_message_bytes and num_crc_check_bytes "
+               << "do not add to correct value";
+    return false;
+  }
+  if (num_message_bytes < 1) {
+    LOG(ERROR) << "num_message_bytes must be positive";
+    return false;
+  }
+  if (num_crc_check_bytes < 0) {
+    LOG(ERROR) << "num_crc_check_bytes must be non-negative";
+    return false;
+  }
+  decode_results->tokens.clear();
+
+  audio_sorvane::DecodeResults raw;
+  bool found = false;
+  switch (kind_) {
+    case kDsss:
+      found = dsss_decoder_->GetToken(&raw);
+      break;
+    case kHotsound:
+      found = hotsound_decoder_->DecodeTokens(&raw);
+      break;
+    case kDtmf:
+      found = dtmf_decoder_->GetToken(&raw);
+      break;
+  }
+  if (!found) return false;
+
+  const auto result = [](const DecodedToken& candidate, std::vector<uint8_t> bytes) {
+    return TokenResult{std::move(bytes), candidate.position,
+                       static_cast<int32_t>(std::lround(candidate.score * 1000.0f))};
+  };
+  if (num_crc_check_bytes == 0) {
+    for (const DecodedToken& candidate : raw.tokens) {
+      decode_results->tokens.push_back(result(candidate, candidate.bytes));
+    }
+    return true;
+  }
+  if (num_crc_check_bytes == 2) {
+    const Crc16Coder coder({.num_message_bytes = num_message_bytes});
+    for (const DecodedToken& candidate : raw.tokens) {
+      if (!coder.Verify(candidate.bytes)) continue;
+      decode_results->tokens.push_back(result(
+          candidate, std::vector<uint8_t>(candidate.bytes.begin(), candidate.bytes.end() - 2)));
+    }
+    decode_results->detection_times = std::move(raw.detection_times);
+    decode_results->detection_scores = std::move(raw.detection_scores);
+    return !decode_results->tokens.empty();
+  }
+  LOG(ERROR) << "Unsupported value for num_crc_check_bytes";
+  return false;
+}
+
+bool AudioModemDecoder::DetectBroadcaster() {
+  switch (kind_) {
+    case kDsss:
+      return dsss_decoder_->DetectBroadcaster();
+    case kHotsound:
+      return hotsound_decoder_->DetectBroadcaster();
+    case kDtmf:
+      return false;
+  }
+  return false;
+}
+
+void AudioModemDecoder::WipeInternalData() {
+  switch (kind_) {
+    case kDsss:
+      dsss_decoder_->WipeInternalData();
+      break;
+    case kHotsound:
+      hotsound_decoder_->WipeInternalData();
+      break;
+    case kDtmf:
+      dtmf_decoder_->Reset();
+      break;
+  }
+}
+
+int AudioModemDecoder::GetMaxSafeInputSize() const {
+  switch (kind_) {
+    case kDsss:
+      return dsss_decoder_->GetMaxSafeInputSize();
+    case kHotsound:
+      return hotsound_decoder_->GetMaxSafeInputSize();
+    case kDtmf:
+      return dtmf_decoder_->GetMaxSafeInputSize();
+  }
+  return 0;
+}
+
+}  // namespace audio_sorvane

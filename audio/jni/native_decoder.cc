@@ -1,0 +1,204 @@
+// Native side of com.tessal.android.orv.audiomodem.NativeDecoder.
+//
+// A registry of decoders addressed by id: ids 0, 1, 2, ... index a vector
+// that grows on demand and never shrinks; id -1 is a separate default slot.
+// Initialising an id replaces its decoder (the old one is destroyed after
+// the new one is in place). Ids past the end, or negative other than -1,
+// end the process. Nothing here locks: calls for one decoder come from one
+// thread at a time and initialise/release must not overlap other calls.
+#include <jni.h>
+
+#include <cstdint>
+#include <memory>
+#include <utility>
+#include <vector>
+
+#include "audio/audio_modem_decoder.h"
+#include "audio/jni/jni_util.h"
+#include "audio/modem_config.h"
+#include "base/logging.h"
+
+namespace {
+
+using audio_sorvane::AudioModemDecoder;
+using audio_sorvane::ScopedLocalRef;
+
+struct Registry {
+  std::vector<std::unique_ptr<AudioModemDecoder>> decoders;
+  std::unique_ptr<AudioModemDecoder> default_decoder;
+};
+
+Registry& GetRegistry() {
+  static auto* registry = new Registry();
+  return *registry;
+}
+
+std::unique_ptr<AudioModemDecoder>& Slot(int decoder_id) {
+  Registry& registry = GetRegistry();
+  if (decoder_id == -1) return registry.default_decoder;
+  CHECK(decoder_id >= 0 && decoder_id < static_cast<int>(registry.decoders.size()));
+  return registry.decoders[decoder_id];
+}
+
+void Store(int decoder_id, std::unique_ptr<AudioModemDecoder> decoder) {
+  Registry& registry = GetRegistry();
+  if (decoder_id >= static_cast<int>(registry.decoders.size())) {
+    registry.decoders.resize(decoder_id + 1);
+  }
+  std::unique_ptr<AudioModemDecoder> old = std::exchange(Slot(decoder_id), std::move(decoder));
+}
+
+// The 16-bit samples of a direct buffer after the checks, in this order.
+struct PcmBlock {
+  const int16_t* samples;
+  int count;
+};
+
+PcmBlock CheckedBlock(JNIEnv* env, jobject buffer, jint offset_bytes, jint length_bytes) {
+  void* direct_buffer = env->GetDirectBufferAddress(buffer);
+  CHECK(direct_buffer != nullptr);
+  CHECK(length_bytes % 2 == 0);
+  const jlong capacity_bytes = env->GetDirectBufferCapacity(buffer);
+  CHECK(length_bytes + offset_bytes <= capacity_bytes);
+  CHECK(offset_bytes >= 0);
+  CHECK(offset_bytes % 2 == 0);
+  // A non-zero offset shortens the block by the offset: callers that pass
+  // offset 0 get length_bytes / 2 samples.
+  return {static_cast<const int16_t*>(direct_buffer) + offset_bytes / 2,
+          length_bytes / 2 - offset_bytes / 2};
+}
+
+}  // namespace
+
+extern "C" {
+
+JNIEXPORT jboolean JNICALL
+Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDsss(
+    JNIEnv*, jclass, jint decoder_id, jint token_length_bytes, jboolean deuse_quadrature_a,
+    jboolean deuse_quadrature_b, jint number_of_taps, jint code_number, jint upsampling_factor,
+    jint bits_per_symbol, jint min_cycles_per_frame, jint baseband_decimation_factor,
+    jboolean use_quadrature, jint max_candidates_to_return, jint num_channels,
+    jboolean with_hotsound, jfloat sample_rate, jfloat desired_carrier_frequency,
+    jfloat detection_duration, jfloat detection_threshold, jfloat input_sample_rate,
+    jfloat buffer_duration_factor) {
+  audio_sorvane::DsssDecoderConfig config;
+  config.coder.number_of_taps = number_of_taps;
+  config.coder.code_number = code_number;
+  config.coder.upsampling_factor = upsampling_factor;
+  config.coder.bits_per_symbol = bits_per_symbol;
+  config.coder.min_cycles_per_frame = min_cycles_per_frame;
+  config.coder.baseband_decimation_factor = baseband_decimation_factor;
+  config.coder.use_quadrature = use_quadrature;
+  config.coder.sample_rate = sample_rate;
+  config.coder.desired_carrier_frequency = desired_carrier_frequency;
+  config.token_length_bytes = token_length_bytes;
+  config.append_check_symbol = deuse_quadrature_a;
+  config.save_received_samples = deuse_quadrature_b;
+  config.max_candidates_to_return = max_candidates_to_return;
+  config.num_channels = num_channels;
+  config.with_hotsound = with_hotsound;
+  config.detection_duration = detection_duration;
+  config.detection_threshold = detection_threshold;
+  config.input_sample_rate = input_sample_rate;
+  config.buffer_duration_factor = buffer_duration_factor;
+  Store(decoder_id, audio_sorvane::MakeDsssDecoder(config));
+  return JNI_TRUE;
+}
+
+JNIEXPORT jboolean JNICALL
+Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDtmf(
+    JNIEnv* env, jclass, jint decoder_id, jint bytes_in_token, jboolean use_checksum_symbol,
+    jint baseband_decimation_factor, jint tones_per_symbol,
+    jint max_candidates_per_decode_token_call, jint num_channels, jfloat sample_rate,
+    jfloat window_duration, jfloat /*ignored_float*/, jfloat input_sample_rate, jfloat adsr_1,
+    jfloat adsr_2, jfloat adsr_3, jfloat adsr_4, jfloat adsr_5, jfloat buffer_duration_factor,
+    jfloatArray tone_frequencies) {
+  audio_sorvane::DtmfDecoderConfig config;
+  config.tones.bytes_in_token = bytes_in_token;
+  config.tones.use_checksum_symbol = use_checksum_symbol;
+  config.tones.baseband_decimation_factor = baseband_decimation_factor;
+  config.tones.tones_per_symbol = tones_per_symbol;
+  config.tones.sample_rate = sample_rate;
+  config.tones.window_duration = window_duration;
+  config.tones.adsr = {adsr_1, adsr_2, adsr_3, adsr_4, adsr_5};
+  if (tone_frequencies != nullptr) {
+    const jsize count = env->GetArrayLength(tone_frequencies);
+    if (count > 0) {
+      jfloat* values = env->GetFloatArrayElements(tone_frequencies, nullptr);
+      if (values == nullptr) return JNI_FALSE;
+      config.tones.tone_frequencies.assign(values, values + count);
+      env->ReleaseFloatArrayElements(tone_frequencies, values, JNI_ABORT);
+    }
+  }
+  config.max_candidates_per_decode_token_call = max_candidates_per_decode_token_call;
+  config.num_channels = num_channels;
+  config.input_sample_rate = input_sample_rate;
+  config.buffer_duration_factor = buffer_duration_factor;
+  std::unique_ptr<AudioModemDecoder> decoder = audio_sorvane::MakeDtmfDecoder(config);
+  if (!decoder) return JNI_FALSE;  // refused ADSR window: registry unchanged
+  Store(decoder_id, std::move(decoder));
+  return JNI_TRUE;
+}
+
+JNIEXPORT void JNICALL
+Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeProcessSamples(
+    JNIEnv* env, jclass, jint decoder_id, jobject buffer, jint offset_bytes, jint length_bytes) {
+  const PcmBlock block = CheckedBlock(env, buffer, offset_bytes, length_bytes);
+  // The decoders take samples on the 16-bit scale: 1000 stays 1000.0.
+  std::vector<float> samples(block.samples, block.samples + std::max(block.count, 0));
+  Slot(decoder_id)->ProcessSamples(samples);
+}
+
+JNIEXPORT void JNICALL
+Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeProcessSamplesWithHotsound(
+    JNIEnv* env, jclass, jint decoder_id, jobject buffer, jint offset_bytes, jint length_bytes) {
+  const PcmBlock block = CheckedBlock(env, buffer, offset_bytes, length_bytes);
+  Slot(decoder_id)->ProcessSamplesInt16(block.samples, block.count);
+}
+
+JNIEXPORT void JNICALL Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeGetTokens(
+    JNIEnv* env, jclass, jint decoder_id, jobject results, jint num_message_bytes,
+    jint num_crc_check_bytes) {
+  ScopedLocalRef<jclass> results_class(env, env->GetObjectClass(results));
+  if (!results_class) return;
+  const jmethodID add_token = env->GetMethodID(results_class.get(), "addToken", "([B)V");
+  if (add_token == nullptr) return;
+
+  AudioModemDecoder::DecodeResults decoded;
+  if (!Slot(decoder_id)->DecodeTokens(&decoded, num_message_bytes, num_crc_check_bytes)) return;
+  for (const AudioModemDecoder::TokenResult& token : decoded.tokens) {
+    const jsize size = static_cast<jsize>(token.bytes.size());
+    ScopedLocalRef<jbyteArray> array(env, env->NewByteArray(size));
+    if (!array) return;
+    env->SetByteArrayRegion(array.get(), 0, size,
+                            reinterpret_cast<const jbyte*>(token.bytes.data()));
+    if (env->ExceptionCheck()) return;
+    env->CallVoidMethod(results, add_token, array.get());
+    if (env->ExceptionCheck()) return;
+  }
+}
+
+JNIEXPORT jboolean JNICALL
+Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeDetectBroadcaster(JNIEnv*, jclass,
+                                                                           jint decoder_id) {
+  return Slot(decoder_id)->DetectBroadcaster() ? JNI_TRUE : JNI_FALSE;
+}
+
+JNIEXPORT void JNICALL
+Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeWipeInternalData(JNIEnv*, jclass,
+                                                                          jint decoder_id) {
+  Slot(decoder_id)->WipeInternalData();
+}
+
+JNIEXPORT jint JNICALL
+Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeGetMaxSafeInputSize(
+    JNIEnv*, jclass, jint decoder_id) {
+  return 2 * Slot(decoder_id)->GetMaxSafeInputSize();
+}
+
+JNIEXPORT void JNICALL Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeRelease(
+    JNIEnv*, jclass, jint decoder_id) {
+  std::unique_ptr<AudioModemDecoder> old = std::move(Slot(decoder_id));
+}
+
+}  // extern "C"
