@@ -22,7 +22,8 @@ test: build
 
 demo: build
 	@mkdir -p out
-	@$(BUILD_DIR)/tools/sorvel encode --token 536f7276656c --crc -o out/token.wav
+	@$(BUILD_DIR)/tools/sorvel encode --token 536f7276656c --crc --loop 3 -o out/token.wav
+	@$(BUILD_DIR)/tools/sorvel decode out/token.wav --crc
 
 bench: build
 	@$(BUILD_DIR)/bench/sorvel_benchmarks

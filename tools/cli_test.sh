@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
-# Command-line behaviour of `sorvel encode`: refusals exit with 2 and one
-# line naming the problem; good tokens become WAV files of the right length.
+# Command-line behaviour of `sorvel encode` and `sorvel decode`: refusals
+# exit with 2 and one line naming the problem; good tokens become WAV files
+# of the right length and decode back.
 set -u
 sorvel=$1
 dir=$(mktemp -d)
@@ -35,5 +36,27 @@ size=$(stat -c %s "$dir/dsss.wav" 2>/dev/null || echo 0)
 "$sorvel" encode --scheme dtmf --token 0102030405 -o "$dir/dtmf.wav" >/dev/null
 size=$(stat -c %s "$dir/dtmf.wav" 2>/dev/null || echo 0)
 [ "$size" -eq $((44 + 2 * 9 * 2208)) ] || { echo "FAIL: dtmf.wav has $size bytes"; failures=$((failures + 1)); }
+
+# Round trips through files and through a raw PCM pipe, both schemes, with
+# and without CRC: each prints the message it was given.
+round_trip() {  # round_trip <hex> <encode and decode options...>
+  local hex=$1; shift
+  "$sorvel" encode --token "$hex" --loop 3 "$@" -o "$dir/rt.wav" >/dev/null || return 1
+  "$sorvel" decode "$dir/rt.wav" "$@" | grep -q "$hex" || return 1
+}
+for args in "--crc|536f7276656c" "|0102030405060708" "--scheme dtmf --crc|123456" \
+            "--scheme dtmf|0a0b0c0d0e" "--scheme dtmf --use-checksum-symbol|0a0b0c0d0e"; do
+  options=${args%%|*}
+  hex=${args##*|}
+  # shellcheck disable=SC2086
+  round_trip "$hex" $options || { echo "FAIL: round trip $options $hex"; failures=$((failures + 1)); }
+done
+"$sorvel" encode --token 536f7276656c --crc --loop 3 -o "$dir/pipe.wav" >/dev/null
+tail -c +45 "$dir/pipe.wav" | "$sorvel" decode - --rate 44100 --crc --json |
+  grep -q '"token": "536f7276656c"' || { echo "FAIL: raw pipe"; failures=$((failures + 1)); }
+"$sorvel" decode "$dir/missing.wav" 2>/dev/null
+[ $? -eq 2 ] || { echo "FAIL: unreadable input should exit 2"; failures=$((failures + 1)); }
+"$sorvel" decode "$dir/dtmf.wav" --scheme dsss >/dev/null
+[ $? -eq 1 ] || { echo "FAIL: no token should exit 1"; failures=$((failures + 1)); }
 
 exit $((failures > 0))

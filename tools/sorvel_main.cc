@@ -4,6 +4,7 @@
 
 #include "CLI/CLI.hpp"
 #include "base/logging.h"
+#include "tools/decode_command.h"
 #include "tools/encode_command.h"
 
 int main(int argc, char** argv) {
@@ -19,6 +20,7 @@ int main(int argc, char** argv) {
 
   int exit_code = EXIT_SUCCESS;
   sorvel_cli::RegisterEncodeCommand(&app, &exit_code);
+  sorvel_cli::RegisterDecodeCommand(&app, &exit_code);
 
   try {
     app.parse(argc, argv);
