@@ -67,6 +67,32 @@ std::vector<float> ResampleHighQuality(std::span<const float> input, double inpu
   return out;
 }
 
+std::vector<float> MakeNoise(NoiseKind kind, size_t num_samples, double rms, uint64_t seed) {
+  std::mt19937_64 rng(seed);
+  std::normal_distribution<double> normal(0.0, 1.0);
+  std::vector<double> noise(num_samples);
+  if (kind == NoiseKind::kWhite) {
+    for (double& v : noise) v = normal(rng);
+  } else {
+    // Paul Kellet's economy pink filter: -3 dB per octave within 0.5 dB
+    // above a few Hz.
+    double b0 = 0, b1 = 0, b2 = 0;
+    for (double& v : noise) {
+      const double w = normal(rng);
+      b0 = 0.99765 * b0 + w * 0.0990460;
+      b1 = 0.96300 * b1 + w * 0.2965164;
+      b2 = 0.57000 * b2 + w * 1.0526913;
+      v = b0 + b1 + b2 + w * 0.1848;
+    }
+  }
+  double power = 0.0;
+  for (double v : noise) power += v * v;
+  const double scale = num_samples > 0 && power > 0 ? rms / std::sqrt(power / num_samples) : 0.0;
+  std::vector<float> out(num_samples);
+  for (size_t i = 0; i < num_samples; ++i) out[i] = static_cast<float>(noise[i] * scale);
+  return out;
+}
+
 double Power(std::span<const float> samples) {
   double sum = 0.0;
   for (float v : samples) sum += static_cast<double>(v) * v;
@@ -94,27 +120,8 @@ std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelC
 
   if (std::isfinite(config.snr_db) && signal_power > 0.0) {
     const double noise_rms = std::sqrt(signal_power / std::pow(10.0, config.snr_db / 10.0));
-    std::mt19937_64 rng(config.seed);
-    std::normal_distribution<double> normal(0.0, 1.0);
-    std::vector<double> noise(mono.size());
-    if (config.noise == NoiseKind::kWhite) {
-      for (double& v : noise) v = normal(rng);
-    } else {
-      // Paul Kellet's economy pink filter: -3 dB per octave within 0.5 dB.
-      double b0 = 0, b1 = 0, b2 = 0;
-      for (double& v : noise) {
-        const double w = normal(rng);
-        b0 = 0.99765 * b0 + w * 0.0990460;
-        b1 = 0.96300 * b1 + w * 0.2965164;
-        b2 = 0.57000 * b2 + w * 1.0526913;
-        v = b0 + b1 + b2 + w * 0.1848;
-      }
-    }
-    double noise_power = 0.0;
-    for (double v : noise) noise_power += v * v;
-    noise_power /= static_cast<double>(noise.size());
-    const double scale = noise_rms / std::sqrt(noise_power);
-    for (size_t i = 0; i < mono.size(); ++i) mono[i] += static_cast<float>(noise[i] * scale);
+    const std::vector<float> noise = MakeNoise(config.noise, mono.size(), noise_rms, config.seed);
+    for (size_t i = 0; i < mono.size(); ++i) mono[i] += noise[i];
   }
 
   if (config.channels <= 1) return mono;

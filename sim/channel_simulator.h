@@ -53,6 +53,10 @@ std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelC
 std::vector<float> ResampleHighQuality(std::span<const float> input, double input_rate,
                                        double output_rate);
 
+// `num_samples` of Gaussian noise with the given RMS: white, or pink
+// (-3 dB per octave). Deterministic for a seed.
+std::vector<float> MakeNoise(NoiseKind kind, size_t num_samples, double rms, uint64_t seed);
+
 // Mean square of the samples.
 double Power(std::span<const float> samples);
 

@@ -10,6 +10,7 @@ packages=(
   openjdk-17-jdk-headless junit4
   libsndfile1-dev libcli11-dev
   android-liblog-dev
+  espeak-ng
 )
 
 missing=()
