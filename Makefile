@@ -27,7 +27,7 @@ demo: build
 
 bench: build
 	@$(BUILD_DIR)/bench/sorvel_benchmarks
-	@$(BUILD_DIR)/bench/sorvel_link_quality --seeds 20
+	@for scheme in dsss hotsound dtmf; do $(BUILD_DIR)/bench/sorvel_link_quality --scheme $$scheme --seeds 20; done
 
 clean:
 	@rm -rf $(BUILD_DIR) out

@@ -81,7 +81,7 @@ void HotsoundDetector::FinishHop() {
   reference_level_ += kSmoothing * (reference - reference_level_);
   // Epsilon: a few LSBs of noise per bin, so digital silence scores 0.
   const double epsilon = 1e3 * static_cast<double>(config_.hop_size);
-  score_ = static_cast<float>(5.0 * signal_level_ / (reference_level_ + epsilon));
+  score_ = static_cast<float>(10.0 * signal_level_ / (reference_level_ + epsilon));
 }
 
 std::unique_ptr<HotsoundDetector> MakeHotsoundDetector(int sample_rate, int step) {

@@ -42,11 +42,11 @@ struct HotsoundDetectorConfig {
 // it measures Goertzel powers at five frequencies across the spread carrier
 // (f0 + {-1000, -500, 0, 500, 1000} Hz) and at five reference frequencies
 // 4.5 to 6.5 kHz below it, smooths both sums over about 16 hops and scores
-//   score = 5 * signal / (reference + epsilon).
-// White noise scores about 5, pink noise and speech less (their energy
-// falls with frequency); a broadcast at 0 dB full-band SNR scores about 40.
-// A score above 25.0 (the band 7 dB above its surroundings) means a
-// broadcast is on the air.
+//   score = 10 * signal / (reference + epsilon).
+// White noise scores about 10 (at most 14.4 over a minute here), pink noise
+// and speech less (their energy falls with frequency); a broadcast at 0 dB
+// full-band SNR scores about 80. A score above 25.0 (the band 4 dB above
+// its surroundings) means a broadcast is on the air.
 class HotsoundDetector {
  public:
   static constexpr float kThreshold = 25.0f;
