@@ -67,4 +67,26 @@ void BM_DsssDecoderMemory(benchmark::State& state) {
 }
 BENCHMARK(BM_DsssDecoderMemory)->Iterations(1)->Unit(benchmark::kMillisecond);
 
+// The multi-tone decoder through the facade, same feeding pattern (target:
+// at least 1000x real time).
+void BM_DtmfDecoderRealTime(benchmark::State& state) {
+  const auto encoder = audio_sorvane::MakeDtmfEncoder({});
+  std::vector<float> token;
+  encoder->Encode({0x53, 0x6f, 0x72}, &token, 2);
+  const std::vector<float> signal = sorvel_sim::ApplyChannel(
+      sorvel_sim::RenderLoopedBroadcast(*encoder, token, 10.0), {.snr_db = -10.0});
+  const auto decoder = audio_sorvane::MakeDtmfDecoder({});
+  audio_sorvane::AudioModemDecoder::DecodeResults results;
+  for (auto _ : state) {
+    for (size_t start = 0, n = 0; start + 441 <= signal.size(); start += 441, ++n) {
+      decoder->ProcessSamples(std::span<const float>(signal).subspan(start, 441));
+      if (n % 25 == 24) benchmark::DoNotOptimize(decoder->DecodeTokens(&results, 3, 2));
+    }
+  }
+  state.SetItemsProcessed(state.iterations() * static_cast<int64_t>(signal.size()));
+  state.counters["x_real_time"] = benchmark::Counter(
+      static_cast<double>(signal.size()) / 44100.0, benchmark::Counter::kIsIterationInvariantRate);
+}
+BENCHMARK(BM_DtmfDecoderRealTime)->Unit(benchmark::kMillisecond);
+
 }  // namespace

@@ -15,6 +15,9 @@ using ComplexMatrix = Eigen::MatrixXcf;
 using FloatArray = Eigen::ArrayXf;
 using ComplexArray = Eigen::ArrayXcf;
 
+// For per-row passes over long rows (one row per tone, in time order).
+using RowMajorFloatMatrix = Eigen::Matrix<float, Eigen::Dynamic, Eigen::Dynamic, Eigen::RowMajor>;
+
 static_assert(!FloatMatrix::IsRowMajor && !ComplexMatrix::IsRowMajor,
               "score and phasor tables are column-major");
 

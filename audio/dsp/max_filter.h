@@ -1,8 +1,8 @@
 // Running maximum over a window of `window_size` samples:
 //   output[j] = max of input[i] for i in [j + ahead - window_size + 1, j + ahead]
 // clipped to the signal, with ahead = (window_size - 1) / 2 (centred for odd
-// sizes). A monotonic queue of indices makes the cost linear in the length,
-// independent of the window size.
+// sizes). Block prefix and suffix maxima make the cost linear in the length,
+// independent of the window size (see the .cc).
 //
 // Stateless and thread-compatible. A negative length, a window below 1, or a
 // null pointer with a non-empty signal ends the process through CHECK.
@@ -11,9 +11,7 @@
 
 namespace audio_dsp {
 
-// `input` and `output` hold `num_samples` floats; they may be the same array
-// only if num_samples <= (window_size + 1) / 2 (otherwise the filter would read
-// samples it already overwrote), so callers pass distinct arrays.
+// `input` and `output` hold `num_samples` floats; they may be the same array.
 void MaxFilter(const float* input, int num_samples, int window_size,
                float* output);
 

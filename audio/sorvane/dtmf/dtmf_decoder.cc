@@ -205,21 +205,27 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   // Tone strengths over their local level, partly levelled across tones.
   const ToneNormalizationParams& norm = params_.tone_normalization_params;
   const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
-  audio_dsp::FloatMatrix local(num_frequencies_, length);
-  std::vector<float> row(length);
-  for (int i = 0; i < num_frequencies_; ++i) {
-    audio_dsp::MaxFilter(tone_strength_buffers_[i].View(0).data(), length, window, row.data());
-    local.row(i) = Eigen::Map<const audio_dsp::FloatVector>(row.data(), length).transpose();
+  // Row-major (one row per tone): every pass below walks rows in time order.
+  const int rows = num_frequencies_;
+  std::vector<const float*> raw(rows);
+  for (int i = 0; i < rows; ++i) raw[i] = tone_strength_buffers_[i].View(0).data();
+  audio_dsp::RowMajorFloatMatrix local(rows, length);
+  for (int i = 0; i < rows; ++i) {
+    audio_dsp::MaxFilter(raw[i], length, window, local.row(i).data());
   }
-  std::vector<const float*> raw(num_frequencies_);
-  for (int i = 0; i < num_frequencies_; ++i) raw[i] = tone_strength_buffers_[i].View(0).data();
-  audio_dsp::FloatMatrix tone_scores(num_frequencies_, length);
-  for (int t = 0; t < length; ++t) {
-    const float strongest = local.col(t).maxCoeff();
-    for (int i = 0; i < num_frequencies_; ++i) {
-      const float level = local(i, t) + norm.cross_frequency_weight * (strongest - local(i, t)) +
+  std::vector<float> strongest(local.row(0).data(), local.row(0).data() + length);
+  for (int i = 1; i < rows; ++i) {
+    const float* levels = local.row(i).data();
+    for (int t = 0; t < length; ++t) strongest[t] = std::max(strongest[t], levels[t]);
+  }
+  audio_dsp::RowMajorFloatMatrix tone_scores(rows, length);
+  for (int i = 0; i < rows; ++i) {
+    const float* levels = local.row(i).data();
+    float* scores = tone_scores.row(i).data();
+    for (int t = 0; t < length; ++t) {
+      const float level = levels[t] + norm.cross_frequency_weight * (strongest[t] - levels[t]) +
                           norm.division_floor;
-      tone_scores(i, t) = raw[i][t] / level;
+      scores[t] = raw[i][t] / level;
     }
   }
 
@@ -227,15 +233,27 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   // the smoothed mean of the others.
   CHECK(tone_scores.rows() == num_frequencies_);
   CHECK(tone_scores.cols() == tone_strength_buffer_size_);
+  // With few tones per symbol, keeping the strongest ones in a small sorted
+  // array is cheaper than a partial sort of every column.
   const int k = num_frequencies_ - params_.tones_per_symbol;
-  std::vector<float> signal(length), noise(length), column(num_frequencies_);
+  const int top_count = params_.tones_per_symbol;
+  std::vector<float> signal(length), noise(length), top(top_count);
   for (int t = 0; t < length; ++t) {
-    for (int i = 0; i < num_frequencies_; ++i) column[i] = tone_scores(i, t);
-    std::nth_element(column.begin(), column.begin() + k, column.end());
-    signal[t] = column[k];
+    std::fill(top.begin(), top.end(), -INFINITY);  // descending
     float sum = 0.0f;
-    for (int j = 0; j < k; ++j) sum += column[j];
-    noise[t] = k > 0 ? sum / static_cast<float>(k) : 0.0f;
+    for (int i = 0; i < rows; ++i) {
+      const float v = tone_scores(i, t);
+      sum += v;
+      if (v > top[top_count - 1]) {
+        int j = top_count - 1;
+        for (; j > 0 && top[j - 1] < v; --j) top[j] = top[j - 1];
+        top[j] = v;
+      }
+    }
+    signal[t] = top[top_count - 1];  // the k-th smallest value
+    float top_sum = 0.0f;
+    for (float v : top) top_sum += v;
+    noise[t] = k > 0 ? (sum - top_sum) / static_cast<float>(k) : 0.0f;
   }
   SmoothNoise(&noise);
   std::vector<float> acquisition_scores(length);
