@@ -5,6 +5,7 @@
 #include <jni.h>
 
 #include <span>
+#include <vector>
 
 namespace audio_sorvane {
 
@@ -27,6 +28,10 @@ class ScopedLocalRef {
   JNIEnv* env_;
   T ref_;
 };
+
+// Copies a Java float[] (null reads as empty). False when the elements
+// cannot be read.
+bool ReadFloatArray(JNIEnv* env, jfloatArray array, std::vector<float>* values);
 
 // A new Java byte[] holding `samples` as 16-bit little-endian PCM (empty
 // samples give an empty array); null when allocation fails or an exception

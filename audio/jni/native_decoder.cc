@@ -121,14 +121,8 @@ Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDtmf(
   config.tones.sample_rate = sample_rate;
   config.tones.window_duration = window_duration;
   config.tones.adsr = {adsr_1, adsr_2, adsr_3, adsr_4, adsr_5};
-  if (tone_frequencies != nullptr) {
-    const jsize count = env->GetArrayLength(tone_frequencies);
-    if (count > 0) {
-      jfloat* values = env->GetFloatArrayElements(tone_frequencies, nullptr);
-      if (values == nullptr) return JNI_FALSE;
-      config.tones.tone_frequencies.assign(values, values + count);
-      env->ReleaseFloatArrayElements(tone_frequencies, values, JNI_ABORT);
-    }
+  if (!audio_sorvane::ReadFloatArray(env, tone_frequencies, &config.tones.tone_frequencies)) {
+    return JNI_FALSE;
   }
   config.max_candidates_per_decode_token_call = max_candidates_per_decode_token_call;
   config.num_channels = num_channels;

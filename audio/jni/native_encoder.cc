@@ -76,14 +76,8 @@ Java_com_tessal_android_orv_audiomodem_NativeEncoder_nativeInitializeDtmf(
   config.sample_rate = sample_rate;
   config.window_duration = window_duration;
   config.adsr = {adsr_1, adsr_2, adsr_3, adsr_4, adsr_5};
-  if (tone_frequencies != nullptr) {
-    const jsize count = env->GetArrayLength(tone_frequencies);
-    if (count > 0) {
-      jfloat* values = env->GetFloatArrayElements(tone_frequencies, nullptr);
-      if (values == nullptr) return JNI_FALSE;
-      config.tone_frequencies.assign(values, values + count);
-      env->ReleaseFloatArrayElements(tone_frequencies, values, JNI_ABORT);
-    }
+  if (!audio_sorvane::ReadFloatArray(env, tone_frequencies, &config.tone_frequencies)) {
+    return JNI_FALSE;
   }
   std::unique_ptr<AudioModemEncoder> encoder = audio_sorvane::MakeDtmfEncoder(config);
   if (!encoder) return JNI_FALSE;  // refused ADSR window: keep the old encoder
