@@ -4,6 +4,9 @@
 #include <numbers>
 #include <random>
 
+#include <complex>
+
+#include "audio/dsp/kiss_fft.h"
 #include "audio/dsp/rational_factor_resampler.h"
 #include "audio/dsp/resampler.h"
 
@@ -99,6 +102,72 @@ double Power(std::span<const float> samples) {
   return samples.empty() ? 0.0 : sum / static_cast<double>(samples.size());
 }
 
+namespace {
+
+// The smallest even length >= n that the FFT handles without Bluestein.
+int FastEvenSize(size_t n) {
+  int size = static_cast<int>(std::max<size_t>(n, 2));
+  while (size % 2 != 0 || !audio_dsp::IsFastFFTSize(size)) ++size;
+  return size;
+}
+
+// Multiplies the spectrum of the zero-padded signal by gain(f).
+template <typename Gain>
+void FilterInFrequency(std::vector<float>* signal, double rate, Gain gain) {
+  const size_t n = signal->size();
+  const int size = FastEvenSize(n + 4096);  // padding absorbs the short response
+  std::vector<float> padded(size, 0.0f);
+  std::copy(signal->begin(), signal->end(), padded.begin());
+  audio_dsp::RealFFTTransformer fft(size, /*normalize_inverse=*/true);
+  std::vector<std::complex<float>> spectrum;
+  fft.Forward(padded, &spectrum);
+  for (size_t k = 0; k < spectrum.size(); ++k) {
+    spectrum[k] *= static_cast<float>(gain(k * rate / size));
+  }
+  fft.Inverse(spectrum, &padded);
+  std::copy_n(padded.begin(), n, signal->begin());
+}
+
+}  // namespace
+
+std::vector<float> Convolve(std::span<const float> a, std::span<const float> b) {
+  if (a.empty() || b.empty()) return {};
+  const size_t n = a.size() + b.size() - 1;
+  const int size = FastEvenSize(n);
+  audio_dsp::RealFFTTransformer fft(size, /*normalize_inverse=*/true);
+  std::vector<float> pa(size, 0.0f), pb(size, 0.0f);
+  std::copy(a.begin(), a.end(), pa.begin());
+  std::copy(b.begin(), b.end(), pb.begin());
+  std::vector<std::complex<float>> sa, sb;
+  fft.Forward(pa, &sa);
+  fft.Forward(pb, &sb);
+  for (size_t k = 0; k < sa.size(); ++k) sa[k] *= sb[k];
+  fft.Inverse(sa, &pa);
+  pa.resize(n);
+  return pa;
+}
+
+std::vector<float> RoomImpulseResponse(double rt60, double direct_to_reverberant_db,
+                                       double rate, uint64_t seed) {
+  const size_t start = static_cast<size_t>(0.003 * rate);
+  const size_t length = start + static_cast<size_t>(rt60 * rate);
+  std::vector<float> h(std::max<size_t>(length, 1), 0.0f);
+  h[0] = 1.0f;
+  if (length <= start) return h;
+  std::mt19937_64 rng(seed ^ 0x5eed5eedULL);
+  std::normal_distribution<double> normal;
+  // exp(-6.908 t / rt60) is -60 dB at t = rt60.
+  const double decay = 6.907755 / (rt60 * rate);
+  double energy = 0.0;
+  for (size_t i = start; i < length; ++i) {
+    h[i] = static_cast<float>(normal(rng) * std::exp(-decay * (i - start)));
+    energy += static_cast<double>(h[i]) * h[i];
+  }
+  const double scale = std::sqrt(std::pow(10.0, -direct_to_reverberant_db / 10.0) / energy);
+  for (size_t i = start; i < length; ++i) h[i] = static_cast<float>(h[i] * scale);
+  return h;
+}
+
 std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelConfig& config) {
   // Motion: a source approaching at v is heard (1 + v / c) times faster.
   const double speed_factor = 1.0 + config.speed / kSpeedOfSound;
@@ -110,18 +179,45 @@ std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelC
     const float scale = static_cast<float>(config.level / peak);
     for (float& v : signal) v *= scale;
   }
-  const double signal_power = Power(signal);
+  const size_t broadcast_length = signal.size();
+  if (config.rt60 > 0.0) {
+    signal = Convolve(signal, RoomImpulseResponse(config.rt60, config.direct_to_reverberant_db,
+                                                  config.output_rate, config.seed));
+  }
+  if (config.band_limit > 0.0) {
+    // A fourth-order Butterworth magnitude: -3 dB at the limit, -24 dB an
+    // octave above.
+    FilterInFrequency(&signal, config.output_rate, [&](double f) {
+      return 1.0 / std::sqrt(1.0 + std::pow(f / config.band_limit, 8.0));
+    });
+  }
+  const double signal_power =
+      Power(std::span<const float>(signal).first(std::min(broadcast_length, signal.size())));
 
   const size_t lead = static_cast<size_t>(std::lround(config.leading_silence * config.output_rate));
   const size_t trail =
       static_cast<size_t>(std::lround(config.trailing_silence * config.output_rate));
-  std::vector<float> mono(lead + signal.size() + trail, 0.0f);
-  std::copy(signal.begin(), signal.end(), mono.begin() + lead);
+  std::vector<float> mono(lead + broadcast_length + trail, 0.0f);
+  std::copy_n(signal.begin(), std::min(signal.size(), mono.size() - lead), mono.begin() + lead);
 
   if (std::isfinite(config.snr_db) && signal_power > 0.0) {
     const double noise_rms = std::sqrt(signal_power / std::pow(10.0, config.snr_db / 10.0));
     const std::vector<float> noise = MakeNoise(config.noise, mono.size(), noise_rms, config.seed);
     for (size_t i = 0; i < mono.size(); ++i) mono[i] += noise[i];
+  }
+  if (!config.interference.empty()) {
+    const float gain = static_cast<float>(std::pow(10.0, config.interference_gain_db / 20.0));
+    for (size_t i = 0; i < mono.size(); ++i) {
+      mono[i] += gain * config.interference[i % config.interference.size()];
+    }
+  }
+  if (config.gain_db != 0.0) {
+    const float gain = static_cast<float>(std::pow(10.0, config.gain_db / 20.0));
+    for (float& v : mono) v *= gain;
+  }
+  if (config.clip > 0.0) {
+    const float limit = static_cast<float>(config.clip * 32767.0);
+    for (float& v : mono) v = std::clamp(v, -limit, limit);
   }
 
   if (config.channels <= 1) return mono;

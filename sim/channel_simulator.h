@@ -1,12 +1,15 @@
 // A simulated acoustic channel between a phone's speaker and another phone's
-// microphone, for tests, benchmarks and `sorvel simulate`.
+// microphone, for tests, benchmarks and `sorvel simulate` / `sorvel eval`.
 //
-// The broadcast (what the sender plays, full scale +-1) is delayed by a
-// leading silence, sped up or slowed down by the relative motion (Doppler,
-// at 340 m/s), resampled to the receiver's rate, scaled to the 16-bit scale
-// the decoders take, and buried in noise at a full-band SNR: signal power is
-// measured over the broadcast only (not the silence), noise power over the
-// full band. Deterministic for a given seed.
+// In order: the broadcast (what the sender plays, full scale +-1) is sped up
+// or slowed down by the relative motion (Doppler, at 340 m/s) and resampled
+// to the receiver's rate; scaled to `level` on the 16-bit scale the decoders
+// take; convolved with a room (a direct path plus exponentially decaying
+// noise with the given RT60); rolled off above the microphone's band limit;
+// placed between leading and trailing silence; buried in white or pink
+// noise at a full-band SNR (signal power measured over the broadcast only,
+// noise power over the full band); mixed with an interfering recording;
+// amplified by `gain_db` and clipped. Deterministic for a given seed.
 #ifndef SIM_CHANNEL_SIMULATOR_H_
 #define SIM_CHANNEL_SIMULATOR_H_
 
@@ -41,6 +44,15 @@ struct ChannelConfig {
   NoiseKind noise = NoiseKind::kWhite;
   int channels = 1;               // the signal is copied to every channel
   uint64_t seed = 1;
+  double rt60 = 0.0;              // s, reverberation time; 0: no room
+  double direct_to_reverberant_db = 3.0;  // energy of the direct path over the tail
+  double band_limit = 0.0;        // Hz, microphone roll-off (-3 dB); 0: none
+  double gain_db = 0.0;           // applied to everything before clipping
+  double clip = 0.0;              // fraction of full scale to clip at; 0: none
+  // An interfering recording at the receiver's rate on the 16-bit scale
+  // (looped to length), and its gain.
+  std::vector<float> interference = {};
+  double interference_gain_db = 0.0;
 };
 
 // The received signal, channels interleaved, on the 16-bit scale (not
@@ -56,6 +68,15 @@ std::vector<float> ResampleHighQuality(std::span<const float> input, double inpu
 // `num_samples` of Gaussian noise with the given RMS: white, or pink
 // (-3 dB per octave). Deterministic for a seed.
 std::vector<float> MakeNoise(NoiseKind kind, size_t num_samples, double rms, uint64_t seed);
+
+// A room's impulse response at `rate`: 1 at time 0 (the direct path), then
+// from 3 ms on Gaussian noise decaying by 60 dB over `rt60` seconds, its
+// energy `direct_to_reverberant_db` below the direct path's.
+std::vector<float> RoomImpulseResponse(double rt60, double direct_to_reverberant_db,
+                                       double rate, uint64_t seed);
+
+// Linear convolution through zero-padded FFTs: size a + b - 1.
+std::vector<float> Convolve(std::span<const float> a, std::span<const float> b);
 
 // Mean square of the samples.
 double Power(std::span<const float> samples);
