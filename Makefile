@@ -21,13 +21,12 @@ test: build
 	@cd $(BUILD_DIR) && ctest --output-on-failure -j $(JOBS)
 
 demo: build
-	@mkdir -p out
-	@$(BUILD_DIR)/tools/sorvel encode --token 536f7276656c --crc --loop 3 -o out/token.wav
-	@$(BUILD_DIR)/tools/sorvel decode out/token.wav --crc
+	@bash tools/demo.sh $(BUILD_DIR)/tools/sorvel out
 
 bench: build
 	@$(BUILD_DIR)/bench/sorvel_benchmarks
-	@for scheme in dsss hotsound dtmf; do $(BUILD_DIR)/bench/sorvel_link_quality --scheme $$scheme --seeds 20; done
+	@mkdir -p out
+	@$(BUILD_DIR)/tools/sorvel eval --scheme dsss,hotsound,dtmf --seeds 20 --plot out/link-quality.svg
 
 clean:
 	@rm -rf $(BUILD_DIR) out

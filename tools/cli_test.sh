@@ -59,4 +59,14 @@ tail -c +45 "$dir/pipe.wav" | "$sorvel" decode - --rate 44100 --crc --json |
 "$sorvel" decode "$dir/dtmf.wav" --scheme dsss >/dev/null
 [ $? -eq 1 ] || { echo "FAIL: no token should exit 1"; failures=$((failures + 1)); }
 
+# Simulation: a token through a noisy, reverberant room decodes; -o writes
+# what the microphone heard; eval prints its table and writes its plot.
+"$sorvel" simulate --token 536f7276656c --crc --snr 0 --rt60 0.3 --speed 0.5 --rate 48000 |
+  grep -q 536f7276656c || { echo "FAIL: simulate"; failures=$((failures + 1)); }
+"$sorvel" simulate --token 536f7276656c --crc --seconds 1 -o "$dir/heard.wav" >/dev/null &&
+  [ -s "$dir/heard.wav" ] || { echo "FAIL: simulate -o"; failures=$((failures + 1)); }
+"$sorvel" eval --scheme dsss,dtmf --seeds 1 --snr-max 0 --snr-min 0 --plot "$dir/plot.svg" \
+  2>/dev/null | grep -q "dtmf: lowest SNR with >= 95% success 0 dB" &&
+  grep -q "<polyline" "$dir/plot.svg" || { echo "FAIL: eval"; failures=$((failures + 1)); }
+
 exit $((failures > 0))

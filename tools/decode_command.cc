@@ -20,16 +20,10 @@ namespace {
 
 struct DecodeOptions {
   ModemOptions modem;
+  ReceiverOptions receiver;
   std::string input;
   float raw_rate = 44100.0f;
   int raw_channels = 1;
-  bool hotsound = false;
-  int interval_ms = 250;
-  bool json = false;
-  int max_candidates = 2;
-  float detection_duration = 0.175f;
-  float detection_threshold = 4.0f;
-  std::optional<float> buffer_duration_factor;
 };
 
 // Reads interleaved frames on the 16-bit scale from a sound file or from
@@ -86,91 +80,125 @@ class AudioSource {
   std::vector<uint8_t> raw_;
 };
 
-std::unique_ptr<audio_sorvane::AudioModemDecoder> MakeDecoder(DecodeOptions& o, float rate,
-                                                              int channels) {
-  if (o.modem.is_dsss()) {
-    audio_sorvane::DsssDecoderConfig config;
-    config.coder = o.modem.dsss.coder;
-    config.token_length_bytes = o.modem.TokenBytes();
-    config.append_check_symbol = o.modem.dsss.append_check_symbol;
-    config.max_candidates_to_return = o.max_candidates;
-    config.num_channels = channels;
-    config.with_hotsound = o.hotsound;
-    config.detection_duration = o.detection_duration;
-    config.detection_threshold = o.detection_threshold;
-    config.input_sample_rate = rate;
-    if (o.buffer_duration_factor) config.buffer_duration_factor = *o.buffer_duration_factor;
-    return audio_sorvane::MakeDsssDecoder(config);
-  }
-  audio_sorvane::DtmfDecoderConfig config;
-  config.tones = o.modem.dtmf;
-  config.max_candidates_per_decode_token_call = o.max_candidates;
-  config.num_channels = channels;
-  config.input_sample_rate = rate;
-  if (o.buffer_duration_factor) config.buffer_duration_factor = *o.buffer_duration_factor;
-  return audio_sorvane::MakeDtmfDecoder(config);
-}
-
 int Run(DecodeOptions& o) {
-  const auto fail = [](const std::string& message) {
-    std::cerr << "sorvel decode: " << message << "\n";
-    return kUsageError;
-  };
-  if (std::string e = ResolveModemOptions(o.modem); !e.empty()) return fail(e);
-  if (o.interval_ms <= 0) return fail("--interval must be positive");
-  if (o.max_candidates < 1 || o.max_candidates > 6) {
-    return fail("--max-candidates must be in [1, 6]");
-  }
   AudioSource source;
-  if (std::string e = source.Open(o); !e.empty()) return fail(e);
-  if (o.hotsound && !o.modem.is_dsss()) return fail("--hotsound works with the dsss scheme");
-  // The DSSS carrier needs a receiver rate above twice its frequency.
-  if (o.modem.is_dsss() && source.rate() < 2 * o.modem.dsss.coder.desired_carrier_frequency) {
-    return fail("a " + std::to_string(static_cast<int>(source.rate())) +
-                " Hz input cannot carry the " +
-                std::to_string(static_cast<int>(o.modem.dsss.coder.desired_carrier_frequency)) +
-                " Hz carrier");
+  StreamDecoder decoder;
+  std::string error = ResolveModemOptions(o.modem);
+  if (error.empty()) error = source.Open(o);
+  if (error.empty()) error = decoder.Start(o.modem, o.receiver, source.rate(), source.channels());
+  if (!error.empty()) {
+    std::cerr << "sorvel decode: " << error << "\n";
+    return kUsageError;
   }
-  const auto decoder = MakeDecoder(o, source.rate(), source.channels());
-  if (!decoder) return fail("the ADSR window was refused (see the log line above)");
-
   const size_t block_frames = std::max<size_t>(1, static_cast<size_t>(source.rate() / 100));
-  const double interval = o.interval_ms / 1000.0;
-  const int crc_bytes = o.modem.crc ? 2 : 0;
-  std::set<std::vector<uint8_t>> seen;
   std::vector<float> block;
-  int64_t frames = 0;
-  double next_request = interval;
-  audio_sorvane::AudioModemDecoder::DecodeResults results;
-  const auto request = [&](double now) {
-    if (!decoder->DecodeTokens(&results, o.modem.MessageBytes(), crc_bytes)) return;
-    for (const auto& token : results.tokens) {
-      if (!seen.insert(token.bytes).second) continue;
-      if (o.json) {
-        std::printf("{\"time\": %.3f, \"token\": \"%s\", \"scheme\": \"%s\"}\n", now,
-                    ToHex(token.bytes).c_str(), o.modem.scheme.c_str());
-      } else {
-        std::printf("%8.3f s  %s\n", now, ToHex(token.bytes).c_str());
-      }
-      std::fflush(stdout);
-    }
-  };
   while (true) {
     source.Read(block_frames, &block);
     if (block.empty()) break;
-    decoder->ProcessSamples(block);
-    frames += static_cast<int64_t>(block.size()) / source.channels();
-    const double now = frames / static_cast<double>(source.rate());
-    if (now >= next_request) {
-      request(now);
-      next_request += interval;
-    }
+    decoder.Feed(block);
   }
-  request(frames / static_cast<double>(source.rate()));
-  return seen.empty() ? 1 : 0;
+  return decoder.Finish() > 0 ? 0 : 1;
 }
 
 }  // namespace
+
+void AddReceiverOptions(CLI::App* command, ReceiverOptions* r) {
+  const std::string group = "Receiver";
+  command->add_flag("--hotsound", r->hotsound,
+                    "DSSS only: wait for the wake-up detector before decoding")->group(group);
+  command->add_option("--interval", r->interval_ms, "Ask for tokens every MS of audio")
+      ->capture_default_str()->group(group);
+  command->add_flag("--json", r->json, "One JSON object per token and line")->group(group);
+  command->add_option("--max-candidates", r->max_candidates, "Candidates per request, best first")
+      ->capture_default_str()->group(group);
+  command->add_option("--detection-duration", r->detection_duration,
+                      "DSSS broadcaster detection window, seconds")
+      ->capture_default_str()->group(group);
+  command->add_option("--detection-threshold", r->detection_threshold,
+                      "DSSS broadcaster detection threshold")->capture_default_str()->group(group);
+  command->add_option("--buffer-duration-factor", r->buffer_duration_factor,
+                      "Audio held, in token durations [dsss 4, dtmf 6]")->group(group);
+}
+
+std::string StreamDecoder::Start(const ModemOptions& modem, const ReceiverOptions& receiver,
+                                 float rate, int channels) {
+  modem_ = modem;
+  receiver_ = receiver;
+  rate_ = rate;
+  channels_ = channels;
+  if (receiver.interval_ms <= 0) return "--interval must be positive";
+  if (receiver.max_candidates < 1 || receiver.max_candidates > 6) {
+    return "--max-candidates must be in [1, 6]";
+  }
+  if (rate <= 0 || channels < 1) return "the input needs a positive rate and channel count";
+  if (receiver.hotsound && !modem.is_dsss()) return "--hotsound works with the dsss scheme";
+  // The DSSS carrier needs a receiver rate above twice its frequency.
+  if (modem.is_dsss() && rate < 2 * modem.dsss.coder.desired_carrier_frequency) {
+    return "a " + std::to_string(static_cast<int>(rate)) + " Hz input cannot carry the " +
+           std::to_string(static_cast<int>(modem.dsss.coder.desired_carrier_frequency)) +
+           " Hz carrier";
+  }
+  if (modem.is_dsss()) {
+    audio_sorvane::DsssDecoderConfig config;
+    config.coder = modem.dsss.coder;
+    config.token_length_bytes = modem.TokenBytes();
+    config.append_check_symbol = modem.dsss.append_check_symbol;
+    config.max_candidates_to_return = receiver.max_candidates;
+    config.num_channels = channels;
+    config.with_hotsound = receiver.hotsound;
+    config.detection_duration = receiver.detection_duration;
+    config.detection_threshold = receiver.detection_threshold;
+    config.input_sample_rate = rate;
+    if (receiver.buffer_duration_factor) {
+      config.buffer_duration_factor = *receiver.buffer_duration_factor;
+    }
+    decoder_ = audio_sorvane::MakeDsssDecoder(config);
+  } else {
+    audio_sorvane::DtmfDecoderConfig config;
+    config.tones = modem.dtmf;
+    config.max_candidates_per_decode_token_call = receiver.max_candidates;
+    config.num_channels = channels;
+    config.input_sample_rate = rate;
+    if (receiver.buffer_duration_factor) {
+      config.buffer_duration_factor = *receiver.buffer_duration_factor;
+    }
+    decoder_ = audio_sorvane::MakeDtmfDecoder(config);
+    if (!decoder_) return "the ADSR window was refused (see the log line above)";
+  }
+  next_request_ = receiver.interval_ms / 1000.0;
+  return "";
+}
+
+void StreamDecoder::Feed(std::span<const float> samples) {
+  decoder_->ProcessSamples(samples);
+  frames_ += static_cast<int64_t>(samples.size()) / channels_;
+  const double now = frames_ / static_cast<double>(rate_);
+  if (now >= next_request_) {
+    Request(now);
+    next_request_ += receiver_.interval_ms / 1000.0;
+  }
+}
+
+int StreamDecoder::Finish() {
+  Request(frames_ / static_cast<double>(rate_));
+  return static_cast<int>(seen_.size());
+}
+
+void StreamDecoder::Request(double now) {
+  audio_sorvane::AudioModemDecoder::DecodeResults results;
+  if (!decoder_->DecodeTokens(&results, modem_.MessageBytes(), modem_.crc ? 2 : 0)) return;
+  for (const auto& token : results.tokens) {
+    if (!seen_.insert(token.bytes).second) continue;
+    if (first_token_seconds_ < 0) first_token_seconds_ = now;
+    if (receiver_.json) {
+      std::printf("{\"time\": %.3f, \"token\": \"%s\", \"scheme\": \"%s\"}\n", now,
+                  ToHex(token.bytes).c_str(), modem_.scheme.c_str());
+    } else {
+      std::printf("%8.3f s  %s\n", now, ToHex(token.bytes).c_str());
+    }
+    std::fflush(stdout);
+  }
+}
 
 void RegisterDecodeCommand(CLI::App* app, int* exit_code) {
   auto options = std::make_shared<DecodeOptions>();
@@ -182,19 +210,7 @@ void RegisterDecodeCommand(CLI::App* app, int* exit_code) {
       ->capture_default_str();
   command->add_option("--channels", options->raw_channels, "Channels of raw input")
       ->capture_default_str();
-  command->add_flag("--hotsound", options->hotsound,
-                    "DSSS only: wait for the wake-up detector before decoding");
-  command->add_option("--interval", options->interval_ms, "Ask for tokens every MS of audio")
-      ->capture_default_str();
-  command->add_flag("--json", options->json, "One JSON object per token and line");
-  command->add_option("--max-candidates", options->max_candidates,
-                      "Candidates per request, best first")->capture_default_str();
-  command->add_option("--detection-duration", options->detection_duration,
-                      "DSSS broadcaster detection window, seconds")->capture_default_str();
-  command->add_option("--detection-threshold", options->detection_threshold,
-                      "DSSS broadcaster detection threshold")->capture_default_str();
-  command->add_option("--buffer-duration-factor", options->buffer_duration_factor,
-                      "Audio held, in token durations [dsss 4, dtmf 6]");
+  AddReceiverOptions(command, &options->receiver);
   AddModemOptions(command, &options->modem, /*transmitter=*/false);
   command->callback([=] { *exit_code = Run(*options); });
 }

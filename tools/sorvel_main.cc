@@ -6,6 +6,7 @@
 #include "base/logging.h"
 #include "tools/decode_command.h"
 #include "tools/encode_command.h"
+#include "tools/simulate_command.h"
 
 int main(int argc, char** argv) {
   CLI::App app{
@@ -21,6 +22,8 @@ int main(int argc, char** argv) {
   int exit_code = EXIT_SUCCESS;
   sorvel_cli::RegisterEncodeCommand(&app, &exit_code);
   sorvel_cli::RegisterDecodeCommand(&app, &exit_code);
+  sorvel_cli::RegisterSimulateCommand(&app, &exit_code);
+  sorvel_cli::RegisterEvalCommand(&app, &exit_code);
 
   try {
     app.parse(argc, argv);
