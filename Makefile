@@ -2,9 +2,10 @@
 BUILD_DIR ?= build
 JOBS ?= $(shell nproc)
 MAKEFLAGS += --no-print-directory
+SHELL := /bin/bash
 CMAKE_FLAGS ?= -DCMAKE_BUILD_TYPE=RelWithDebInfo -DSORVEL_WERROR=ON
 
-.PHONY: all deps configure build test demo bench clean
+.PHONY: all deps configure build test demo bench soak sanitize arm64 fuzz clean
 
 all: build
 
@@ -28,5 +29,44 @@ bench: build
 	@mkdir -p out
 	@$(BUILD_DIR)/tools/sorvel eval --scheme dsss,hotsound,dtmf --seeds 20 --plot out/link-quality.svg
 
+# Two hours through every decoder kind; prints the figures.
+soak: build
+	@$(BUILD_DIR)/bench/sorvel_soak --minutes 120 --every 180
+
+# The test suite under AddressSanitizer + UBSan. The JVM tests are left out:
+# the JVM does not start with the ASan runtime preloaded into its process.
+sanitize: deps
+	@cmake -S . -B build-sanitize -DCMAKE_BUILD_TYPE=Debug -DSORVEL_SANITIZE=ON \
+	  -DSORVEL_WERROR=ON -DSORVEL_BUILD_BENCHMARKS=OFF -DSORVEL_BUILD_JAVA=OFF >/dev/null
+	@cmake --build build-sanitize -j $(JOBS)
+	@cd build-sanitize && ctest --output-on-failure -j $(JOBS) -LE soak
+
+# The library and its tests cross-built for arm64 and run under qemu-user.
+# Death tests are skipped there: gtest's forked children hang under qemu.
+arm64:
+	@bash tools/install-deps.sh --arm64
+	@cmake -S . -B build-arm64 -DCMAKE_TOOLCHAIN_FILE=cmake/aarch64-linux-gnu.cmake \
+	  -DCMAKE_BUILD_TYPE=RelWithDebInfo -DSORVEL_WERROR=ON -DSORVEL_BUILD_TOOLS=OFF \
+	  -DSORVEL_BUILD_BENCHMARKS=OFF -DSORVEL_BUILD_JAVA=OFF >/dev/null
+	@cmake --build build-arm64 -j $(JOBS)
+	@cd build-arm64 && ctest --output-on-failure -j $(JOBS) -E DeathTest --timeout 300
+
+# Each fuzzer for FUZZ_SECONDS from seeds made of encoded tokens.
+FUZZ_SECONDS ?= 60
+FUZZERS = decoder symbol token_selector sound_file
+fuzz:
+	@bash tools/install-deps.sh --fuzz
+	@cmake -S . -B build-fuzz -DCMAKE_C_COMPILER=clang -DCMAKE_CXX_COMPILER=clang++ \
+	  -DCMAKE_BUILD_TYPE=RelWithDebInfo -DSORVEL_FUZZ=ON >/dev/null
+	@cmake --build build-fuzz -j $(JOBS)
+	@build-fuzz/fuzz/fuzz_seeds build-fuzz/corpus
+	@for f in $(FUZZERS); do \
+	  echo "== $${f}_fuzzer, $(FUZZ_SECONDS) s"; \
+	  build-fuzz/fuzz/$${f}_fuzzer -max_total_time=$(FUZZ_SECONDS) -max_len=120000 \
+	    -rss_limit_mb=4096 -print_final_stats=1 build-fuzz/corpus/$$f 2>&1 | \
+	    grep -E '^#[0-9]+ +DONE|stat::number_of_executed_units|ERROR|SUMMARY|Check failed'; \
+	  test $${PIPESTATUS[0]} -eq 0 || exit 1; \
+	done
+
 clean:
-	@rm -rf $(BUILD_DIR) out
+	@rm -rf $(BUILD_DIR) build-sanitize build-arm64 build-fuzz out

@@ -1,8 +1,13 @@
 # cmake -DLIBRARY=<path> -P CheckSharedLibrary.cmake
 # Fails unless every exported symbol of LIBRARY is a JNI entry point of
 # com.tessal.android.orv.audiomodem and every LOAD segment is 16 KB aligned.
-find_program(NM nm REQUIRED)
-find_program(READELF readelf REQUIRED)
+# NM and READELF may be given (the cross toolchain's); else the host's.
+if(NOT NM)
+  find_program(NM nm REQUIRED)
+endif()
+if(NOT READELF)
+  find_program(READELF readelf REQUIRED)
+endif()
 
 execute_process(COMMAND ${NM} -D --defined-only ${LIBRARY}
                 OUTPUT_VARIABLE symbols RESULT_VARIABLE rc)

@@ -59,5 +59,11 @@ else()
       set(JAVA_HOME "${JAVA_HOME}" CACHE PATH "JDK used for JNI and Java")
     endif()
   endif()
-  find_package(JNI REQUIRED)
+  if(CMAKE_CROSSCOMPILING)
+    # jni.h and jni_md.h are the same for every Linux target; take the host
+    # JDK's rather than looking for a target JVM.
+    set(JNI_INCLUDE_DIRS "${JAVA_HOME}/include" "${JAVA_HOME}/include/linux")
+  else()
+    find_package(JNI REQUIRED)
+  endif()
 endif()

@@ -13,6 +13,21 @@ packages=(
   espeak-ng
 )
 
+# Optional groups: --fuzz (clang and its fuzzer runtime), --arm64 (the
+# cross compiler, qemu and the arm64 libraries the unit tests link).
+for group in "$@"; do
+  case $group in
+    --fuzz) packages+=(clang libclang-rt-14-dev) ;;
+    --arm64)
+      if ! dpkg --print-foreign-architectures | grep -qx arm64; then
+        [ "$(id -u)" -ne 0 ] && sudo dpkg --add-architecture arm64 || dpkg --add-architecture arm64
+      fi
+      packages+=(g++-aarch64-linux-gnu qemu-user libkissfft-dev:arm64 libgtest-dev:arm64
+                 libgmock-dev:arm64) ;;
+    *) echo "install-deps: unknown option $group" >&2; exit 2 ;;
+  esac
+done
+
 missing=()
 for p in "${packages[@]}"; do
   if ! dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q 'install ok installed'; then

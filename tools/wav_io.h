@@ -3,6 +3,8 @@
 #ifndef TOOLS_WAV_IO_H_
 #define TOOLS_WAV_IO_H_
 
+#include <cstdint>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -23,6 +25,9 @@ struct WavData {
 // Reads any file libsndfile understands. Returns an empty string or the
 // reason it failed.
 std::string ReadWav(const std::string& path, WavData* data);
+
+// The same from a file image in memory.
+std::string ReadWavFromMemory(std::span<const uint8_t> image, WavData* data);
 
 }  // namespace sorvel_cli
 

@@ -18,27 +18,19 @@ using audio_dsp::FloatVector;
 // chosen at load time. The portable way to vectorise these loops on both
 // targets without intrinsics.
 typedef float Float8 __attribute__((vector_size(32)));
-// The helpers below are inlined into each clone; no 32-byte vector crosses a
-// real call boundary, so the ABI note on them does not apply.
-#if defined(__GNUC__) && !defined(__clang__)
-#pragma GCC diagnostic ignored "-Wpsabi"
-#endif
+// Loads and horizontal sums are macros, not functions: a 32-byte vector
+// passed to or returned from a function outside an AVX context changes the
+// calling convention, which compilers reject or warn about.
+#define SORVEL_LOAD8(name, pointer) \
+  Float8 name;                      \
+  std::memcpy(&name, (pointer), sizeof(Float8))
+#define SORVEL_SUM8(v) (((v)[0] + (v)[1]) + ((v)[2] + (v)[3]) + (((v)[4] + (v)[5]) + ((v)[6] + (v)[7])))
 
 #if defined(__x86_64__) && defined(__ELF__)
 #define SORVEL_MULTIVERSION __attribute__((target_clones("avx2", "default")))
 #else
 #define SORVEL_MULTIVERSION
 #endif
-
-[[gnu::always_inline]] inline Float8 Load8(const float* p) {
-  Float8 v;
-  std::memcpy(&v, p, sizeof(v));
-  return v;
-}
-
-[[gnu::always_inline]] inline float Sum8(Float8 v) {
-  return ((v[0] + v[1]) + (v[2] + v[3])) + ((v[4] + v[5]) + (v[6] + v[7]));
-}
 
 // re/im correlation of each chunk of `code` with the frame.
 SORVEL_MULTIVERSION void CorrelateChunks(const float* code, const float* frame_real,
@@ -54,17 +46,19 @@ SORVEL_MULTIVERSION void CorrelateChunks(const float* code, const float* frame_r
     Float8 sum_re = {}, sum_im = {};
     int k = 0;
     for (; k + 8 <= size; k += 8) {
-      const Float8 tv = Load8(t + k);
-      sum_re += tv * Load8(re + k);
-      sum_im += tv * Load8(im + k);
+      SORVEL_LOAD8(tv, t + k);
+      SORVEL_LOAD8(rv, re + k);
+      SORVEL_LOAD8(iv, im + k);
+      sum_re += tv * rv;
+      sum_im += tv * iv;
     }
     float tail_re = 0.0f, tail_im = 0.0f;
     for (; k < size; ++k) {
       tail_re += t[k] * re[k];
       tail_im += t[k] * im[k];
     }
-    out_real[c] = Sum8(sum_re) + tail_re;
-    out_imaginary[c] = Sum8(sum_im) + tail_im;
+    out_real[c] = SORVEL_SUM8(sum_re) + tail_re;
+    out_imaginary[c] = SORVEL_SUM8(sum_im) + tail_im;
   }
 }
 
@@ -83,8 +77,10 @@ SORVEL_MULTIVERSION void CorrelateChunks8(const float* code, const float* frame_
     const float* im = frame_imaginary + offset;
     Float8 sum_re = {}, sum_im = {};
     for (int k = 0; k < size; ++k) {
-      sum_re += t[k] * Load8(re + k);
-      sum_im += t[k] * Load8(im + k);
+      SORVEL_LOAD8(rv, re + k);
+      SORVEL_LOAD8(iv, im + k);
+      sum_re += t[k] * rv;
+      sum_im += t[k] * iv;
     }
     std::memcpy(out_real + 8 * c, &sum_re, sizeof(sum_re));
     std::memcpy(out_imaginary + 8 * c, &sum_im, sizeof(sum_im));
@@ -103,7 +99,8 @@ SORVEL_MULTIVERSION void FrequencyPowers8(const float* phasors_real,
     const float* pi = phasors_imaginary + i * num_chunks;
     Float8 acc_re = {}, acc_im = {};
     for (int c = 0; c < num_chunks; ++c) {
-      const Float8 x = Load8(corr_real + 8 * c), y = Load8(corr_imaginary + 8 * c);
+      SORVEL_LOAD8(x, corr_real + 8 * c);
+      SORVEL_LOAD8(y, corr_imaginary + 8 * c);
       acc_re += pr[c] * x - pi[c] * y;
       acc_im += pr[c] * y + pi[c] * x;
     }
@@ -122,8 +119,8 @@ SORVEL_MULTIVERSION void FrequencyPowers(const float* phasors_real,
   for (int i = 0; i < padded; i += 8) {
     Float8 acc_re = {}, acc_im = {};
     for (int c = 0; c < num_chunks; ++c) {
-      const Float8 a = Load8(phasors_real + c * padded + i);
-      const Float8 b = Load8(phasors_imaginary + c * padded + i);
+      SORVEL_LOAD8(a, phasors_real + c * padded + i);
+      SORVEL_LOAD8(b, phasors_imaginary + c * padded + i);
       const float x = corr_real[c], y = corr_imaginary[c];
       acc_re += a * x - b * y;
       acc_im += a * y + b * x;

@@ -77,7 +77,9 @@ TEST_F(AcquisitionScorerTest, ScoresPeaksOnCodePhaseInAnyBlocks) {
 }
 
 #if GTEST_HAS_DEATH_TEST
-TEST_F(AcquisitionScorerTest, MismatchedBlocksAreFatal) {
+using AcquisitionScorerDeathTest = AcquisitionScorerTest;
+
+TEST_F(AcquisitionScorerDeathTest, MismatchedBlocksAreFatal) {
   AcquisitionScorer scorer = MakeScorer();
   std::vector<float> scores;
   EXPECT_DEATH(scorer.ScoreSamples(std::vector<float>(5), std::vector<float>(4), &scores),
