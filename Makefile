@@ -64,7 +64,7 @@ fuzz:
 	  echo "== $${f}_fuzzer, $(FUZZ_SECONDS) s"; \
 	  build-fuzz/fuzz/$${f}_fuzzer -max_total_time=$(FUZZ_SECONDS) -max_len=120000 \
 	    -rss_limit_mb=4096 -print_final_stats=1 build-fuzz/corpus/$$f 2>&1 | \
-	    grep -E '^#[0-9]+ +DONE|stat::number_of_executed_units|ERROR|SUMMARY|Check failed'; \
+	    grep -E '^#[0-9]+[[:space:]]+DONE|stat::number_of_executed_units|ERROR|SUMMARY|Check failed'; \
 	  test $${PIPESTATUS[0]} -eq 0 || exit 1; \
 	done
 
