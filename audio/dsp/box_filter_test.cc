@@ -61,6 +61,17 @@ TEST(BoxFilterTest, MatchesDefinition) {
 // A 3-row table of 2 columns (column-major). The first pass runs across the
 // column boundary: element 2 (row 2, column 0) sums elements 1..3.
 TEST(BoxFilter2DTest, FlatPassThenPerRowPass) {
+  // The row pass equals one strided BoxFilter per row, bit for bit.
+  std::mt19937 rng(5);
+  std::uniform_real_distribution<float> uniform(-1.0f, 1.0f);
+  std::vector<float> table(7 * 23), flat(table.size()), expected(table.size()), actual;
+  for (float& v : table) v = uniform(rng);
+  for (int width : {1, 4, 9, 30}) {
+    BoxFilter(table.data(), static_cast<int>(table.size()), 1, 3, flat.data());
+    for (int r = 0; r < 7; ++r) BoxFilter(flat.data() + r, 23, 7, width, expected.data() + r);
+    BoxFilter2D(table, 7, 3, width, false, &actual);
+    EXPECT_EQ(actual, expected) << "width " << width;
+  }
   std::vector<float> output;
   BoxFilter2D(std::vector<float>{1, 0, 0, 0, 0, 0}, 3, 3, 2, false, &output);
   EXPECT_THAT(output, ElementsAreArray({1.0f, 1.0f, 0.0f, 1.0f, 1.0f, 0.0f}));
