@@ -6,6 +6,24 @@
 
 namespace audio_sorvane {
 
+DsssCoderConfig MakeDsssCoderConfig(jint number_of_taps, jint code_number,
+                                    jint upsampling_factor, jint bits_per_symbol,
+                                    jint min_cycles_per_frame, jint baseband_decimation_factor,
+                                    jboolean use_quadrature, jfloat sample_rate,
+                                    jfloat desired_carrier_frequency) {
+  DsssCoderConfig coder;
+  coder.number_of_taps = number_of_taps;
+  coder.code_number = code_number;
+  coder.upsampling_factor = upsampling_factor;
+  coder.bits_per_symbol = bits_per_symbol;
+  coder.min_cycles_per_frame = min_cycles_per_frame;
+  coder.baseband_decimation_factor = baseband_decimation_factor;
+  coder.use_quadrature = use_quadrature;
+  coder.sample_rate = sample_rate;
+  coder.desired_carrier_frequency = desired_carrier_frequency;
+  return coder;
+}
+
 bool ReadFloatArray(JNIEnv* env, jfloatArray array, std::vector<float>* values) {
   values->clear();
   if (array == nullptr) return true;

@@ -7,6 +7,8 @@
 #include <span>
 #include <vector>
 
+#include "audio/modem_config.h"
+
 namespace audio_sorvane {
 
 // Deletes a local reference when it goes out of scope, so that loops and
@@ -28,6 +30,13 @@ class ScopedLocalRef {
   JNIEnv* env_;
   T ref_;
 };
+
+// The DSSS coder settings both peers receive, in their argument order.
+DsssCoderConfig MakeDsssCoderConfig(jint number_of_taps, jint code_number,
+                                    jint upsampling_factor, jint bits_per_symbol,
+                                    jint min_cycles_per_frame, jint baseband_decimation_factor,
+                                    jboolean use_quadrature, jfloat sample_rate,
+                                    jfloat desired_carrier_frequency);
 
 // Copies a Java float[] (null reads as empty). False when the elements
 // cannot be read.

@@ -82,15 +82,9 @@ Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDsss(
     jfloat detection_duration, jfloat detection_threshold, jfloat input_sample_rate,
     jfloat buffer_duration_factor) {
   audio_sorvane::DsssDecoderConfig config;
-  config.coder.number_of_taps = number_of_taps;
-  config.coder.code_number = code_number;
-  config.coder.upsampling_factor = upsampling_factor;
-  config.coder.bits_per_symbol = bits_per_symbol;
-  config.coder.min_cycles_per_frame = min_cycles_per_frame;
-  config.coder.baseband_decimation_factor = baseband_decimation_factor;
-  config.coder.use_quadrature = use_quadrature;
-  config.coder.sample_rate = sample_rate;
-  config.coder.desired_carrier_frequency = desired_carrier_frequency;
+  config.coder = audio_sorvane::MakeDsssCoderConfig(
+      number_of_taps, code_number, upsampling_factor, bits_per_symbol, min_cycles_per_frame,
+      baseband_decimation_factor, use_quadrature, sample_rate, desired_carrier_frequency);
   config.token_length_bytes = token_length_bytes;
   config.append_check_symbol = deuse_quadrature_a;
   config.save_received_samples = deuse_quadrature_b;

@@ -44,15 +44,9 @@ Java_com_tessal_android_orv_audiomodem_NativeEncoder_nativeInitializeDsss(
     jint broadcast_sample_rate, jfloat sample_rate,
     jfloat desired_carrier_frequency, jfloat start_transition_duration) {
   audio_sorvane::DsssEncoderConfig config;
-  config.coder.number_of_taps = number_of_taps;
-  config.coder.code_number = code_number;
-  config.coder.upsampling_factor = upsampling_factor;
-  config.coder.bits_per_symbol = bits_per_symbol;
-  config.coder.min_cycles_per_frame = min_cycles_per_frame;
-  config.coder.baseband_decimation_factor = baseband_decimation_factor;
-  config.coder.use_quadrature = use_quadrature;
-  config.coder.sample_rate = sample_rate;
-  config.coder.desired_carrier_frequency = desired_carrier_frequency;
+  config.coder = audio_sorvane::MakeDsssCoderConfig(
+      number_of_taps, code_number, upsampling_factor, bits_per_symbol, min_cycles_per_frame,
+      baseband_decimation_factor, use_quadrature, sample_rate, desired_carrier_frequency);
   config.token_length_bytes = token_length_bytes;
   config.append_check_symbol = append_check_symbol;
   config.high_pass_at_carrier = high_pass_at_carrier;

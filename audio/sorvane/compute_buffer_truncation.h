@@ -20,6 +20,14 @@ struct BufferTruncation {
 BufferTruncation ComputeBufferTruncation(int input_size, int buffered_size,
                                          int max_good_block_size, int max_buffer_size);
 
+// The largest block (samples, channels interleaved) one call can take
+// without cutting into a token already in the buffer: the room beside one
+// token, never negative.
+inline int MaxSafeInputSize(int max_buffer_size, int max_good_block_size, int num_channels) {
+  const int room = max_buffer_size - max_good_block_size;
+  return (room > 0 ? room : 0) * num_channels;
+}
+
 }  // namespace audio_sorvane
 
 #endif  // AUDIO_SORVANE_COMPUTE_BUFFER_TRUNCATION_H_

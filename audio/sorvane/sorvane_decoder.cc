@@ -132,7 +132,7 @@ void SorvaneDecoder::WipeInternalData() {
 
 int SorvaneDecoder::GetMaxSafeInputSize() const {
   if (!initialized_) return 0;
-  return std::max(0, max_buffer_size_ - max_good_block_size_) * num_channels_;
+  return MaxSafeInputSize(max_buffer_size_, max_good_block_size_, num_channels_);
 }
 
 void SorvaneDecoder::ProcessSamples(std::span<const float> received_samples) {

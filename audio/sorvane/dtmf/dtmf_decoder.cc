@@ -102,7 +102,7 @@ void DtmfDecoder::Reset() {
 
 int DtmfDecoder::GetMaxSafeInputSize() const {
   if (!initialized_) return 0;
-  return std::max(0, max_buffer_size_ - max_good_block_size_) * num_channels_;
+  return MaxSafeInputSize(max_buffer_size_, max_good_block_size_, num_channels_);
 }
 
 void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
