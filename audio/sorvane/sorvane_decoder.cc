@@ -233,22 +233,24 @@ bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
                          params_.num_symbol_periods_to_sum, /*allow_ragged=*/true, &filtered);
   const float threshold =
       params_.peak_threshold * params_.box_width * params_.num_symbol_periods_to_sum;
-  for (float& v : filtered) {
-    if (v < threshold) v = 0.0f;
-  }
+  for (float& v : filtered) v = v < threshold ? 0.0f : v;
 
-  // One peak per run of positive scores; peaks on a common grid form groups.
-  std::vector<DecodingGroup> groups;
+  // One peak per run of positive scores (a tight scan first: most of the
+  // buffer is below threshold), then peaks on a common grid form groups.
+  std::vector<int> peaks;
+  const float* values = filtered.data();
   const int size = static_cast<int>(filtered.size());
   for (int i = 0; i < size;) {
-    if (filtered[i] <= 0.0f) {
-      ++i;
-      continue;
-    }
+    while (i < size && values[i] <= 0.0f) ++i;
+    if (i == size) break;
     int peak = i;
-    for (; i < size && filtered[i] > 0.0f; ++i) {
-      if (filtered[i] > filtered[peak]) peak = i;
+    for (; i < size && values[i] > 0.0f; ++i) {
+      if (values[i] > values[peak]) peak = i;
     }
+    peaks.push_back(peak);
+  }
+  std::vector<DecodingGroup> groups;
+  for (int peak : peaks) {
     bool added = false;
     for (DecodingGroup& group : groups) {
       if (group.TryAdd(peak, filtered[peak])) {
