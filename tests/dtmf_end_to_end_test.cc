@@ -89,6 +89,39 @@ TEST(DtmfEndToEndTest, LifecycleAndBufferBudget) {
   EXPECT_EQ(Decode(decoder, Received({}, token, {}), 1, 44100.0f), token);
 }
 
+// Each request reuses the columns the previous one computed; the results
+// must equal those of a decoder that computes everything afresh, including
+// after the buffer has started dropping its oldest values.
+TEST(DtmfEndToEndTest, RepeatedRequestsMatchAFreshComputation) {
+  const std::vector<float> signal =
+      Received({}, {1, 2, 3, 4, 5}, {.leading_silence = 1.0, .snr_db = 0.0, .seed = 5});
+  const size_t block = 441;
+  const auto feed = [&](DtmfDecoder& decoder, size_t from, size_t to) {
+    for (size_t start = from; start < to; start += block) {
+      decoder.ProcessSamples(std::span<const float>(signal).subspan(start, block));
+    }
+  };
+  DtmfDecoder incremental{DtmfDecoderParams()};
+  incremental.Init(1, 44100.0f);
+  DecodeResults results, fresh_results;
+  size_t fed = 0;
+  for (const double seconds : {0.8, 2.5, 3.4, 3.9}) {
+    const size_t until = static_cast<size_t>(seconds * 100) * block;
+    for (; fed < until; fed += block) {
+      feed(incremental, fed, fed + block);
+      incremental.GetToken(&results);
+    }
+    DtmfDecoder fresh{DtmfDecoderParams()};
+    fresh.Init(1, 44100.0f);
+    feed(fresh, 0, until);
+    fresh.GetToken(&fresh_results);
+    ASSERT_FALSE(results.detection_scores.empty()) << seconds;
+    EXPECT_EQ(results.detection_times, fresh_results.detection_times) << seconds;
+    EXPECT_EQ(results.detection_scores, fresh_results.detection_scores) << seconds;
+    EXPECT_EQ(results.scores_table, fresh_results.scores_table) << seconds;
+  }
+}
+
 #if GTEST_HAS_DEATH_TEST
 TEST(DtmfEndToEndDeathTest, ShapeAndParameterFaults) {
   DtmfDecoder stereo{DtmfDecoderParams()};

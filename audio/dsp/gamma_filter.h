@@ -40,6 +40,22 @@ class GammaFilter {
     return in;
   }
 
+  // Filters `num_samples` samples of `input` into `output` (the same
+  // arithmetic as ProcessSample, with the stages held in registers for the
+  // usual small orders). `output` may alias `input`.
+  void ProcessBlock(const float* input, int num_samples, float* output) {
+    switch (order_) {
+      case 1: return ProcessBlockFixed<1>(input, num_samples, output);
+      case 2: return ProcessBlockFixed<2>(input, num_samples, output);
+      case 3: return ProcessBlockFixed<3>(input, num_samples, output);
+      case 4: return ProcessBlockFixed<4>(input, num_samples, output);
+      case 5: return ProcessBlockFixed<5>(input, num_samples, output);
+      case 6: return ProcessBlockFixed<6>(input, num_samples, output);
+      default:
+        for (int i = 0; i < num_samples; ++i) output[i] = ProcessSample(input[i]);
+    }
+  }
+
   // Zeroes every stage.
   void Reset() { states_.assign(states_.size(), 0.0f); }
   // Sets every stage to `value`, as if that value had been the input forever.
@@ -51,6 +67,22 @@ class GammaFilter {
   float gain() const { return gain_; }
 
  private:
+  template <int kOrder>
+  void ProcessBlockFixed(const float* input, int num_samples, float* output) {
+    float states[kOrder];
+    for (int k = 0; k < kOrder; ++k) states[k] = states_[k];
+    const float gain = gain_;
+    for (int i = 0; i < num_samples; ++i) {
+      float in = input[i];
+      for (int k = 0; k < kOrder; ++k) {
+        states[k] += gain * (in - states[k]);
+        in = states[k];
+      }
+      output[i] = in;
+    }
+    for (int k = 0; k < kOrder; ++k) states_[k] = states[k];
+  }
+
   double sample_rate_;
   int order_;
   double pole_;

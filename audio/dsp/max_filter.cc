@@ -27,32 +27,45 @@ void MaxFilter(const float* input, int num_samples, int window_size, float* outp
   std::vector<float> prefix(n), suffix(n);
   for (int block = 0; block < n; block += w) {
     const int end = std::min(n, block + w);
-    prefix[block] = input[block];
-    for (int i = block + 1; i < end; ++i) prefix[i] = std::max(prefix[i - 1], input[i]);
-    suffix[end - 1] = input[end - 1];
-    for (int i = end - 2; i >= block; --i) suffix[i] = std::max(suffix[i + 1], input[i]);
-  }
-  const float whole = *std::max_element(input, input + n);
-  for (int j = 0; j < n; ++j) {
-    const int last = j + ahead;  // window [last - w + 1, last]
-    const int first = last - w + 1;
-    if (first <= 0 && last >= n - 1) {
-      output[j] = whole;  // the window covers the whole signal
-    } else if (first <= 0) {
-      // Clipped at the start: the maximum of input[0 .. last]. Block
-      // prefixes restart every w samples, and last < w here, so the first
-      // block's prefix is the running maximum from 0.
-      output[j] = prefix[last];
-    } else if (last >= n - 1) {
-      // Clipped at the end: the maximum of input[first .. n - 1], which
-      // lies in the last block or spans the last two.
-      const int last_block = (n - 1) / w * w;
-      output[j] = first >= last_block ? suffix[first]
-                                      : std::max(suffix[first], prefix[n - 1]);
-    } else {
-      output[j] = std::max(suffix[first], prefix[last]);
+    // Both running maxima in one loop: two independent dependency chains
+    // run side by side.
+    float up = input[block], down = input[end - 1];
+    prefix[block] = up;
+    suffix[end - 1] = down;
+    for (int i = 1; i < end - block; ++i) {
+      up = std::max(up, input[block + i]);
+      down = std::max(down, input[end - 1 - i]);
+      prefix[block + i] = up;
+      suffix[end - 1 - i] = down;
     }
   }
+  // Output j reads the window [j + ahead - w + 1, j + ahead]. Outputs whose
+  // window is clipped at the start or end are handled apart, so the
+  // interior loop has no branches.
+  const int last_block = (n - 1) / w * w;
+  const auto clipped = [&](int j) {
+    const int last = j + ahead;
+    const int first = last - w + 1;
+    // A window covering the whole signal means n <= w: one block, whose
+    // prefix ends in the maximum of everything.
+    if (first <= 0 && last >= n - 1) return prefix[n - 1];
+    // Clipped at the start: the maximum of input[0 .. last]. Block prefixes
+    // restart every w samples, and last < w here, so the first block's
+    // prefix is the running maximum from 0.
+    if (first <= 0) return prefix[last];
+    // Clipped at the end: the maximum of input[first .. n - 1], which lies
+    // in the last block or spans the last two.
+    return first >= last_block ? suffix[first] : std::max(suffix[first], prefix[n - 1]);
+  };
+  const int interior_begin = std::min(n, w - 1 - ahead + 1);  // first > 0
+  const int interior_end = std::max(interior_begin, n - 1 - ahead);  // last < n - 1
+  for (int j = 0; j < interior_begin; ++j) output[j] = clipped(j);
+  const float* suffix_at = suffix.data() + (ahead - w + 1);
+  const float* prefix_at = prefix.data() + ahead;
+  for (int j = interior_begin; j < interior_end; ++j) {
+    output[j] = std::max(suffix_at[j], prefix_at[j]);
+  }
+  for (int j = interior_end; j < n; ++j) output[j] = clipped(j);
 }
 
 }  // namespace audio_dsp

@@ -92,6 +92,10 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   tone_strength_buffer_size_ = 0;
   for (ToneStrengthFilter& filter : tone_strength_filters_) filter.Reset();
   for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Clear();
+  tone_scores_.resize(0, 0);
+  column_signal_.clear();
+  column_noise_.clear();
+  columns_begin_ = 0;
   initialized_ = true;
 }
 
@@ -183,9 +187,124 @@ void DtmfDecoder::SmoothNoise(std::vector<float>* noise) const {
   const float tail = d > 0 ? mean(length - d, length) : x[length - 1];
   audio_dsp::GammaFilter filter(order, baseband_sample_rate_, pole);
   filter.SetState(head);
-  for (int i = 0; i < d; ++i) filter.ProcessSample(x[i]);
-  for (int i = d; i < length; ++i) x[i - d] = filter.ProcessSample(x[i]);
-  for (int i = length - d; i < length; ++i) x[i] = filter.ProcessSample(tail);
+  std::vector<float> scratch(d);
+  filter.ProcessBlock(x.data(), d, scratch.data());  // warm-up, output unused
+  filter.ProcessBlock(x.data() + d, length - d, x.data());
+  std::fill(scratch.begin(), scratch.end(), tail);
+  filter.ProcessBlock(scratch.data(), d, x.data() + (length - d));
+}
+
+// Tone normalisation and the per-column acquisition terms. A column's values
+// depend only on the raw strengths inside its max-filter window, clipped to
+// the buffer, and raw strengths never change once buffered. So the columns
+// computed by the previous call are copied where their window is unchanged
+// (it lay inside the old buffer and still lies inside, or the front did not
+// move), and only the new tail and, after a drop, the new head are computed.
+// The result is identical to computing every column afresh.
+void DtmfDecoder::UpdateColumnScores() {
+  const int length = tone_strength_buffer_size_;
+  const int window = static_cast<int>(
+      params_.tone_normalization_params.window_size * baseband_frame_size_);
+  const int ahead = std::max(window - 1, 0) / 2;
+  const int begin = tone_strength_buffers_[0].num_discarded_samples();
+  const int old_begin = columns_begin_;
+  const int old_length = static_cast<int>(column_signal_.size());
+
+  // Reusable columns, in positions of the current buffer.
+  int reuse_from = 0, reuse_to = 0;
+  if (old_length > 0 && begin >= old_begin) {
+    const int shift = begin - old_begin;
+    reuse_from = shift == 0 ? 0 : std::max(window - 1 - ahead, 0);
+    reuse_to = std::min(old_length - shift - ahead, length);
+    if (reuse_to <= reuse_from) reuse_from = reuse_to = 0;
+  }
+
+  audio_dsp::RowMajorFloatMatrix scores(num_frequencies_, length);
+  std::vector<float> signal(length), noise(length);
+  if (reuse_to > reuse_from) {
+    const int shift = begin - old_begin;
+    const int count = reuse_to - reuse_from;
+    for (int i = 0; i < num_frequencies_; ++i) {
+      std::copy_n(tone_scores_.row(i).data() + reuse_from + shift, count,
+                  scores.row(i).data() + reuse_from);
+    }
+    std::copy_n(column_signal_.begin() + reuse_from + shift, count, signal.begin() + reuse_from);
+    std::copy_n(column_noise_.begin() + reuse_from + shift, count, noise.begin() + reuse_from);
+    ComputeColumns(0, reuse_from, &scores, &signal, &noise);
+    ComputeColumns(reuse_to, length, &scores, &signal, &noise);
+  } else {
+    ComputeColumns(0, length, &scores, &signal, &noise);
+  }
+  tone_scores_ = std::move(scores);
+  column_signal_ = std::move(signal);
+  column_noise_ = std::move(noise);
+  columns_begin_ = begin;
+}
+
+// Columns [first, last) of the tone scores, and for each the acquisition's
+// signal (the weakest of the tones_per_symbol strongest tones) and unsmoothed
+// noise (the mean of the other tones).
+void DtmfDecoder::ComputeColumns(int first, int last, audio_dsp::RowMajorFloatMatrix* scores,
+                                 std::vector<float>* signal, std::vector<float>* noise) {
+  if (first >= last) return;
+  const ToneNormalizationParams& norm = params_.tone_normalization_params;
+  const int length = tone_strength_buffer_size_;
+  const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
+  const int ahead = std::max(window - 1, 0) / 2;
+  // The raw strengths every window of these columns can reach.
+  const int from = std::max(0, first + ahead - window + 1);
+  const int to = std::min(length, last + ahead);
+  const int rows = num_frequencies_;
+  const int count = last - first;
+
+  // Local level of every tone (running maximum), and the strongest of them.
+  local_.resize(rows, to - from);
+  std::vector<const float*> raw(rows);
+  for (int i = 0; i < rows; ++i) {
+    raw[i] = tone_strength_buffers_[i].View(0).data();
+    audio_dsp::MaxFilter(raw[i] + from, to - from, window, local_.row(i).data());
+  }
+  const int offset = first - from;
+  std::vector<float> strongest(local_.row(0).data() + offset,
+                               local_.row(0).data() + offset + count);
+  for (int i = 1; i < rows; ++i) {
+    const float* levels = local_.row(i).data() + offset;
+    for (int t = 0; t < count; ++t) strongest[t] = std::max(strongest[t], levels[t]);
+  }
+  // Each tone over its level, partly levelled across tones.
+  for (int i = 0; i < rows; ++i) {
+    const float* levels = local_.row(i).data() + offset;
+    const float* strengths = raw[i] + first;
+    float* out = scores->row(i).data() + first;
+    for (int t = 0; t < count; ++t) {
+      const float level = levels[t] + norm.cross_frequency_weight * (strongest[t] - levels[t]) +
+                          norm.division_floor;
+      out[t] = strengths[t] / level;
+    }
+  }
+
+  // With few tones per symbol, keeping the strongest ones in a small sorted
+  // array is cheaper than a partial sort of every column.
+  const int k = num_frequencies_ - params_.tones_per_symbol;
+  const int top_count = params_.tones_per_symbol;
+  std::vector<float> top(top_count);
+  for (int t = first; t < last; ++t) {
+    std::fill(top.begin(), top.end(), -INFINITY);  // descending
+    float sum = 0.0f;
+    for (int i = 0; i < rows; ++i) {
+      const float v = (*scores)(i, t);
+      sum += v;
+      if (v > top[top_count - 1]) {
+        int j = top_count - 1;
+        for (; j > 0 && top[j - 1] < v; --j) top[j] = top[j - 1];
+        top[j] = v;
+      }
+    }
+    (*signal)[t] = top[top_count - 1];  // the k-th smallest value
+    float top_sum = 0.0f;
+    for (float v : top) top_sum += v;
+    (*noise)[t] = k > 0 ? (sum - top_sum) / static_cast<float>(k) : 0.0f;
+  }
 }
 
 bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
@@ -202,62 +321,16 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   const int length = tone_strength_buffer_size_;
   if (length == 0) return false;
 
-  // Tone strengths over their local level, partly levelled across tones.
-  const ToneNormalizationParams& norm = params_.tone_normalization_params;
-  const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
-  // Row-major (one row per tone): every pass below walks rows in time order.
-  const int rows = num_frequencies_;
-  std::vector<const float*> raw(rows);
-  for (int i = 0; i < rows; ++i) raw[i] = tone_strength_buffers_[i].View(0).data();
-  audio_dsp::RowMajorFloatMatrix local(rows, length);
-  for (int i = 0; i < rows; ++i) {
-    audio_dsp::MaxFilter(raw[i], length, window, local.row(i).data());
-  }
-  std::vector<float> strongest(local.row(0).data(), local.row(0).data() + length);
-  for (int i = 1; i < rows; ++i) {
-    const float* levels = local.row(i).data();
-    for (int t = 0; t < length; ++t) strongest[t] = std::max(strongest[t], levels[t]);
-  }
-  audio_dsp::RowMajorFloatMatrix tone_scores(rows, length);
-  for (int i = 0; i < rows; ++i) {
-    const float* levels = local.row(i).data();
-    float* scores = tone_scores.row(i).data();
-    for (int t = 0; t < length; ++t) {
-      const float level = levels[t] + norm.cross_frequency_weight * (strongest[t] - levels[t]) +
-                          norm.division_floor;
-      scores[t] = raw[i][t] / level;
-    }
-  }
-
-  // Acquisition: the weakest of the strongest tones_per_symbol tones over
-  // the smoothed mean of the others.
+  UpdateColumnScores();
+  const audio_dsp::RowMajorFloatMatrix& tone_scores = tone_scores_;
   CHECK(tone_scores.rows() == num_frequencies_);
   CHECK(tone_scores.cols() == tone_strength_buffer_size_);
-  // With few tones per symbol, keeping the strongest ones in a small sorted
-  // array is cheaper than a partial sort of every column.
-  const int k = num_frequencies_ - params_.tones_per_symbol;
-  const int top_count = params_.tones_per_symbol;
-  std::vector<float> signal(length), noise(length), top(top_count);
-  for (int t = 0; t < length; ++t) {
-    std::fill(top.begin(), top.end(), -INFINITY);  // descending
-    float sum = 0.0f;
-    for (int i = 0; i < rows; ++i) {
-      const float v = tone_scores(i, t);
-      sum += v;
-      if (v > top[top_count - 1]) {
-        int j = top_count - 1;
-        for (; j > 0 && top[j - 1] < v; --j) top[j] = top[j - 1];
-        top[j] = v;
-      }
-    }
-    signal[t] = top[top_count - 1];  // the k-th smallest value
-    float top_sum = 0.0f;
-    for (float v : top) top_sum += v;
-    noise[t] = k > 0 ? (sum - top_sum) / static_cast<float>(k) : 0.0f;
-  }
+  std::vector<float> noise = column_noise_;
   SmoothNoise(&noise);
   std::vector<float> acquisition_scores(length);
-  for (int t = 0; t < length; ++t) acquisition_scores[t] = signal[t] / (1e-12f + noise[t]);
+  for (int t = 0; t < length; ++t) {
+    acquisition_scores[t] = column_signal_[t] / (1e-12f + noise[t]);
+  }
 
   // Symbol timing: the phase of the acquisition folded over whole periods.
   const int period = baseband_frame_size_;

@@ -19,6 +19,7 @@
 #include <span>
 #include <vector>
 
+#include "audio/dsp/eigen_types.h"
 #include "audio/dsp/rational_factor_resampler.h"
 #include "audio/sorvane/dtmf/byte_symbol_converter.h"
 #include "audio/sorvane/dtmf/dtmf_encoder_params.h"
@@ -95,6 +96,11 @@ class DtmfDecoder {
  private:
   // Aligns the gamma-smoothed sequence with its input (see the .cc).
   void SmoothNoise(std::vector<float>* noise) const;
+  // Brings tone_scores_, column_signal_ and column_noise_ up to date with
+  // the buffers, computing only the columns that changed (see the .cc).
+  void UpdateColumnScores();
+  void ComputeColumns(int first, int last, audio_dsp::RowMajorFloatMatrix* scores,
+                      std::vector<float>* signal, std::vector<float>* noise);
 
   DtmfDecoderParams params_;
   ByteSymbolConverter converter_;
@@ -116,6 +122,13 @@ class DtmfDecoder {
   bool initialized_ = false;
 
   std::vector<float> mono_, resampled_, strengths_;  // scratch
+
+  // Per-column results of the last GetToken, for the columns of the buffers
+  // as they were then, starting at stream index columns_begin_.
+  audio_dsp::RowMajorFloatMatrix tone_scores_;
+  std::vector<float> column_signal_, column_noise_;
+  int columns_begin_ = 0;
+  audio_dsp::RowMajorFloatMatrix local_;  // scratch
 };
 
 }  // namespace audio_sorvane
