@@ -53,7 +53,7 @@ for args in "--crc|536f7276656c" "|0102030405060708" "--scheme dtmf --crc|123456
 done
 "$sorvel" encode --token 536f7276656c --crc --loop 3 -o "$dir/pipe.wav" >/dev/null
 tail -c +45 "$dir/pipe.wav" | "$sorvel" decode - --rate 44100 --crc --json |
-  grep -q '"token": "536f7276656c"' || { echo "FAIL: raw pipe"; failures=$((failures + 1)); }
+  grep -q '"token": "536f7276656c", "scheme": "dsss", "rank": 1}' || { echo "FAIL: raw pipe"; failures=$((failures + 1)); }
 "$sorvel" decode "$dir/missing.wav" 2>/dev/null
 [ $? -eq 2 ] || { echo "FAIL: unreadable input should exit 2"; failures=$((failures + 1)); }
 "$sorvel" decode "$dir/dtmf.wav" --scheme dsss >/dev/null

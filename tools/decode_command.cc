@@ -187,14 +187,18 @@ int StreamDecoder::Finish() {
 void StreamDecoder::Request(double now) {
   audio_sorvane::AudioModemDecoder::DecodeResults results;
   if (!decoder_->DecodeTokens(&results, modem_.MessageBytes(), modem_.crc ? 2 : 0)) return;
-  for (const auto& token : results.tokens) {
+  // Tokens come best first. Without CRC bytes nothing vouches for the
+  // lower-ranked candidates, so they are flagged as alternatives.
+  for (size_t rank = 1; rank <= results.tokens.size(); ++rank) {
+    const auto& token = results.tokens[rank - 1];
     if (!seen_.insert(token.bytes).second) continue;
-    if (first_token_seconds_ < 0) first_token_seconds_ = now;
+    if (first_token_seconds_ < 0 && rank == 1) first_token_seconds_ = now;
     if (receiver_.json) {
-      std::printf("{\"time\": %.3f, \"token\": \"%s\", \"scheme\": \"%s\"}\n", now,
-                  ToHex(token.bytes).c_str(), modem_.scheme.c_str());
+      std::printf("{\"time\": %.3f, \"token\": \"%s\", \"scheme\": \"%s\", \"rank\": %zu}\n",
+                  now, ToHex(token.bytes).c_str(), modem_.scheme.c_str(), rank);
     } else {
-      std::printf("%8.3f s  %s\n", now, ToHex(token.bytes).c_str());
+      std::printf("%8.3f s  %s%s\n", now, ToHex(token.bytes).c_str(),
+                  rank == 1 ? "" : "  (alternative)");
     }
     std::fflush(stdout);
   }

@@ -41,7 +41,7 @@ class StreamDecoder {
   void Feed(std::span<const float> samples);
   // A last request; returns the number of distinct tokens found.
   int Finish();
-  // Stream time of the first token, or a negative value.
+  // Stream time of the first best-ranked token, or a negative value.
   double first_token_seconds() const { return first_token_seconds_; }
 
  private:
