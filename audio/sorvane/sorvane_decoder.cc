@@ -221,11 +221,7 @@ bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
     return false;
   }
   CHECK(decode_results);
-  decode_results->tokens.clear();
-  decode_results->detection_times.clear();
-  decode_results->detection_scores.clear();
-  decode_results->symbol_scores.clear();
-  decode_results->scores_table.resize(0, 0);
+  decode_results->Clear();
 
   // Acquisition peaks summed over neighbouring symbol periods.
   std::vector<float> filtered;

@@ -67,6 +67,15 @@ struct DecodeResults {
   std::vector<float> detection_scores;
   SymbolScoreMap symbol_scores;
   audio_dsp::FloatMatrix scores_table;
+
+  // Empties everything, keeping allocated capacity for the next request.
+  void Clear() {
+    tokens.clear();
+    detection_times.clear();
+    detection_scores.clear();
+    symbol_scores.clear();
+    scores_table.resize(0, 0);
+  }
 };
 
 class SorvaneDecoder {

@@ -313,11 +313,7 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
     return false;
   }
   CHECK(decode_results);
-  decode_results->tokens.clear();
-  decode_results->detection_times.clear();
-  decode_results->detection_scores.clear();
-  decode_results->symbol_scores.clear();
-  decode_results->scores_table.resize(0, 0);
+  decode_results->Clear();
   const int length = tone_strength_buffer_size_;
   if (length == 0) return false;
 
