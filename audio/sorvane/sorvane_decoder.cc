@@ -4,6 +4,7 @@
 #include <cmath>
 #include <numbers>
 #include <utility>
+#include <cstdlib>
 
 #include "audio/dsp/box_filter.h"
 #include "audio/dsp/number_util.h"
@@ -70,6 +71,18 @@ SorvaneDecoder::SorvaneDecoder(std::shared_ptr<const SymbolWaveCoder> symbol_wav
         std::vector<std::complex<float>>{{0.25f, 0.0f}, {0.5f, 0.0f}, {0.25f, 0.0f}});
   }
 
+  if (params_.multipath_span > 0.0f) {
+    MultipathScorerParams multipath;
+    multipath.lead = static_cast<int>(std::lround(params_.multipath_lead * baseband_rate_));
+    multipath.span = static_cast<int>(std::lround(params_.multipath_span * baseband_rate_));
+    multipath.channel_frames = params_.channel_frames;
+    multipath.gate = getenv("GATE") ? atof(getenv("GATE")) : params_.channel_gate;
+    if (getenv("CF")) multipath.channel_frames = atoi(getenv("CF"));
+    multipath.max_doppler = max_doppler_;
+    multipath.doppler_step = params_.symbol_frequency_step;
+    multipath_ = std::make_unique<MultipathScorer>(*coder_, multipath);
+  }
+
   TokenSelectorParams selector;
   selector.alphabet_size = coder_->alphabet_size();
   selector.spacer = coder_->alphabet_size() - 1;
@@ -111,6 +124,7 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
   num_scored_ = 0;
   samples_processed_ = 0;
   symbol_score_cache_.clear();
+  doppler_cache_.clear();
   initialized_ = true;
 }
 
@@ -122,6 +136,7 @@ void SorvaneDecoder::ResetStream() {
   smoothing_filter_->Reset();
   scorer_->ZeroHistory();
   symbol_score_cache_.clear();
+  doppler_cache_.clear();
 }
 
 void SorvaneDecoder::WipeInternalData() {
@@ -162,6 +177,8 @@ void SorvaneDecoder::ProcessSamples(std::span<const float> received_samples) {
     const int first_kept = extension_ + baseband_real_.num_discarded_samples();
     symbol_score_cache_.erase(symbol_score_cache_.begin(),
                               symbol_score_cache_.lower_bound(first_kept));
+    doppler_cache_.erase(doppler_cache_.begin(),
+                         doppler_cache_.lower_bound(baseband_real_.num_discarded_samples()));
   }
 
   if (num_channels_ == 1) {
@@ -274,8 +291,15 @@ bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
   if (chosen == nullptr) return false;
 
   const int discarded = baseband_real_.num_discarded_samples();
+  if (multipath_ != nullptr) {
+    for (int t : chosen->times()) {
+      decode_results->detection_times.push_back((discarded + t) / baseband_rate_);
+      decode_results->detection_scores.push_back(filtered[t]);
+    }
+    ScoreGroupOverMultipath(*chosen, filtered, &decode_results->symbol_scores);
+  }
   FloatVector scores;
-  for (int t : chosen->times()) {
+  for (int t : multipath_ != nullptr ? std::vector<int>() : chosen->times()) {
     decode_results->detection_times.push_back((discarded + t) / baseband_rate_);
     decode_results->detection_scores.push_back(filtered[t]);
     if (!ComputeSymbolScores(RefinePeak(t), &scores)) continue;
@@ -291,6 +315,73 @@ bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
     token.position = chosen->IndexOfSlot(token.position);
   }
   return !decode_results->tokens.empty();
+}
+
+void SorvaneDecoder::ScoreGroupOverMultipath(const DecodingGroup& group,
+                                             std::span<const float> filtered,
+                                             SymbolScoreMap* symbol_scores) {
+  // One frame per slot: the detection with the highest summed score (the
+  // others are the same frame seen through other paths).
+  struct SlotFrame {
+    int slot;
+    int start;
+    float score;
+  };
+  std::vector<SlotFrame> frames;
+  const std::vector<int>& times = group.times();
+  for (size_t i = 0; i < times.size();) {
+    const int slot = group.SlotOf(times[i]);
+    size_t best = i;
+    for (; i < times.size() && group.SlotOf(times[i]) == slot; ++i) {
+      if (filtered[times[i]] > filtered[times[best]]) best = i;
+    }
+    frames.push_back({slot, RefinePeak(times[best]), filtered[times[best]]});
+  }
+  // The Doppler offset is searched once, at a reference frame: one whose
+  // offset is known already if there is one, else the strongest.
+  const int size = baseband_real_.size();
+  const int discarded = baseband_real_.num_discarded_samples();
+  const SlotFrame* reference = nullptr;
+  bool known = false;
+  for (const SlotFrame& frame : frames) {
+    if (!multipath_->HasWindow(frame.start, size)) continue;
+    const bool cached = doppler_cache_.count(discarded + frame.start) > 0;
+    if (reference == nullptr || (cached && !known) ||
+        (cached == known && frame.score > reference->score)) {
+      reference = &frame;
+      known = cached;
+    }
+  }
+  if (reference == nullptr) return;
+  const int reference_absolute = discarded + reference->start;
+  float doppler;
+  if (known) {
+    doppler = doppler_cache_[reference_absolute];
+  } else {
+    doppler = multipath_->EstimateDoppler(baseband_real_.View(0), baseband_imaginary_.View(0),
+                                          reference->start, reference_absolute);
+    doppler_cache_[reference_absolute] = doppler;
+  }
+  // The frames lie on the grid the Doppler offset implies; scores are kept
+  // once no later audio can change them.
+  const double period = multipath_->Period(doppler);
+  FloatVector scores;
+  for (const SlotFrame& frame : frames) {
+    const int start = reference->start +
+                      static_cast<int>(std::lround((frame.slot - reference->slot) * period));
+    const int absolute = discarded + start;
+    if (auto cached = symbol_score_cache_.find(absolute); cached != symbol_score_cache_.end()) {
+      symbol_scores->emplace(frame.slot, cached->second);
+      continue;
+    }
+    bool complete = false;
+    if (!multipath_->Score(baseband_real_.View(0), baseband_imaginary_.View(0), start, absolute,
+                           period, doppler, &scores, &complete)) {
+      continue;
+    }
+    if (complete) symbol_score_cache_.emplace(absolute, scores);
+    symbol_scores->emplace(frame.slot, scores);
+  }
 }
 
 int SorvaneDecoder::RefinePeak(int t) const {

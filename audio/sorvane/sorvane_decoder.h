@@ -26,6 +26,8 @@
 #include "audio/dsp/rational_factor_resampler.h"
 #include "audio/dsp/signal_vector_util.h"
 #include "audio/sorvane/acquisition_scorer.h"
+#include "audio/sorvane/decoding_group.h"
+#include "audio/sorvane/multipath_scorer.h"
 #include "audio/sorvane/stream_buffer.h"
 #include "audio/sorvane/symbol_wave_coder.h"
 #include "audio/sorvane/token_selector.h"
@@ -54,6 +56,15 @@ struct SorvaneDecoderParams {
   float symbol_frequency_step = 0.15f;  // cycles per frame
   float detection_threshold = 4.0f;     // on the normalised detection score
   float detection_duration = 0.175f;    // seconds
+  // Multipath: a frame's symbols are scored over the lags from
+  // multipath_lead before to multipath_span after its start (seconds),
+  // combined by a channel estimate averaged over the frame and
+  // channel_frames neighbours on each side. multipath_span 0 scores each
+  // detection at its own lag alone.
+  float multipath_lead = 0.010f;
+  float multipath_span = 0.020f;
+  int channel_frames = 4;
+  float channel_gate = 10.0f;
   int max_candidates_to_consider = 128;  // passed to the token selector
   int max_candidates_rank = 6;
   int max_candidates_to_return = 2;
@@ -116,6 +127,10 @@ class SorvaneDecoder {
   // Scores of every symbol for the frame starting at buffer index t; false
   // when the extended frame is not fully in the buffer.
   bool ComputeSymbolScores(int t, audio_dsp::FloatVector* symbol_scores);
+  // Symbol scores of the chosen group's frames, one per slot, gathered
+  // over the multipath.
+  void ScoreGroupOverMultipath(const DecodingGroup& group, std::span<const float> filtered,
+                               SymbolScoreMap* symbol_scores);
 
   std::shared_ptr<const SymbolWaveCoder> coder_;
   SorvaneDecoderParams params_;
@@ -151,6 +166,8 @@ class SorvaneDecoder {
   StreamBuffer received_samples_;
   int64_t samples_processed_ = 0;
   std::map<int, audio_dsp::FloatVector> symbol_score_cache_;
+  std::unique_ptr<MultipathScorer> multipath_;
+  std::map<int, float> doppler_cache_;  // absolute frame start -> Doppler
 
   // Scratch, kept to avoid allocation per block.
   std::vector<float> mono_;
