@@ -187,7 +187,8 @@ std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelC
     Placement placement;
     if (!PlaceInRoom(room, config.seed, &placement, nullptr)) return {};
     if (room.phone_speaker) FilterInFrequency(&signal, config.output_rate, PhoneSpeakerGain);
-    signal = Convolve(signal, RoomImpulseResponse(room, placement, config.output_rate, config.seed));
+    signal =
+        Convolve(signal, RoomImpulseResponse(room, placement, config.output_rate, config.seed));
     delay = static_cast<size_t>(std::lround(DirectPathSeconds(placement) * config.output_rate));
   } else if (config.rt60 > 0.0) {
     signal = Convolve(signal, RoomImpulseResponse(config.rt60, config.direct_to_reverberant_db,

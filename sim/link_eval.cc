@@ -214,7 +214,9 @@ std::string RenderPlot(const std::vector<Curve>& curves, const std::string& titl
   for (size_t i = 0; i < curves.size(); ++i) {
     const char* color = kColors[i % 8];
     svg << "<polyline fill=\"none\" stroke=\"" << color << "\" stroke-width=\"2\" points=\"";
-    for (const CurvePoint& p : curves[i].points) svg << x(x_of(p)) << "," << y(p.success_rate()) << " ";
+    for (const CurvePoint& p : curves[i].points) {
+      svg << x(x_of(p)) << "," << y(p.success_rate()) << " ";
+    }
     svg << "\"/>\n";
     for (const CurvePoint& p : curves[i].points) {
       svg << "<circle cx=\"" << x(x_of(p)) << "\" cy=\"" << y(p.success_rate())

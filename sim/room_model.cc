@@ -263,7 +263,9 @@ std::vector<float> RoomImpulseResponse(const RoomConfig& room, const Placement& 
         const double amplitude =
             std::pow(beta, bounces) * DirectivityGain(room.source, cosine) / r;
         const double t = r / c;
-        if (bounces > 0 && t >= crossover / 2) fit_energy += amplitude * amplitude * std::exp(decay * t);
+        if (bounces > 0 && t >= crossover / 2) {
+          fit_energy += amplitude * amplitude * std::exp(decay * t);
+        }
         const int bin = static_cast<int>(t / kBinSeconds);
         std::vector<float>& buffer = bins[bin];
         if (buffer.empty()) buffer.assign(fft_size, 0.0f);
@@ -326,7 +328,8 @@ std::vector<float> RoomImpulseResponse(const RoomConfig& room, const Placement& 
     noise_fft.Forward(block, &spectrum);
     const double centre = (start + hop) / rate;
     for (size_t k = 0; k < spectrum.size(); ++k) {
-      spectrum[k] *= static_cast<float>(std::sqrt(density) * std::exp(-0.5 * tail_decay[k] * centre));
+      spectrum[k] *=
+          static_cast<float>(std::sqrt(density) * std::exp(-0.5 * tail_decay[k] * centre));
     }
     noise_fft.Inverse(spectrum, &block);
     for (int i = 0; i < window; ++i) {

@@ -3,7 +3,8 @@
 // wall, air absorption, a source directivity and the phones' own responses.
 //
 // The impulse response has two parts. Up to a crossover time (80 ms after
-// emission, later for long direct paths) image sources give the early
+// emission; sooner in rooms so small that more than 100 000 images would
+// arrive by then, later for long direct paths) image sources give the early
 // reflections: amplitude 1 at 1 m with 1/r spreading, sqrt(1 - alpha) per
 // bounce, the source's gain towards the direction the ray leaves in, a
 // windowed-sinc fractional delay, and the air's attenuation over the path.

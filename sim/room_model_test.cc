@@ -166,7 +166,8 @@ TEST(RoomModelTest, DirectToReverberantFollowsCriticalDistance) {
     double direct = 0, reverberant = 0;
     for (uint64_t seed = 1; seed <= 6; ++seed) {
       Placement placement;
-      const std::vector<float> h = Band(Response(MakeRoom(r, distance), seed, kRate, &placement), 0, 4000);
+      const std::vector<float> h =
+          Band(Response(MakeRoom(r, distance), seed, kRate, &placement), 0, 4000);
       const double arrival = DirectPathSeconds(placement) * kRate;
       for (size_t i = 0; i < h.size(); ++i) {
         (std::fabs(i - arrival) <= 0.0004 * kRate ? direct : reverberant) += h[i] * h[i];

@@ -103,7 +103,9 @@ std::string MakeRoom(const RoomSpec& spec, double rt60, const sorvel_sim::RoomCo
   if (!(room->rt60 > 0)) {
     return "room " + spec.text + " needs an RT60: WxDxH:RT60 or --rt60";
   }
-  if (std::string e = sorvel_sim::CheckRoom(*room); !e.empty()) return "room " + spec.text + ": " + e;
+  if (std::string e = sorvel_sim::CheckRoom(*room); !e.empty()) {
+    return "room " + spec.text + ": " + e;
+  }
   return "";
 }
 

@@ -193,7 +193,8 @@ int RunDistanceEval(const EvalOptions& o, const std::vector<std::string>& scheme
         wrong += text;
       }
     }
-    std::printf("wrong tokens (decoded, not the message):%s\n", wrong.empty() ? " none" : wrong.c_str());
+    std::printf("wrong tokens (decoded, not the message):%s\n",
+                wrong.empty() ? " none" : wrong.c_str());
     for (auto& c : curves) {
       std::printf("%s: mean time to first token %.2f s, decoder %.0fx real time\n",
                   c.label.c_str(), c.mean_first_token_seconds, c.real_time_factor);
