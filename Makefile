@@ -28,6 +28,9 @@ bench: build
 	@$(BUILD_DIR)/bench/sorvel_benchmarks
 	@mkdir -p out
 	@$(BUILD_DIR)/tools/sorvel eval --scheme dsss,hotsound,dtmf --seeds 20 --plot out/link-quality.svg
+	@$(BUILD_DIR)/tools/sorvel eval --scheme dsss,hotsound,dtmf --noise white --snr 10 \
+	  --room 4x3x2.5:0.4,6x5x2.7:0.6,10x8x3.5:1.0 --distances 0.5,1,2,3,5 --source omni \
+	  --seeds 5 --plot out/link-quality-rooms.svg
 
 # Two hours through every decoder kind; prints the figures.
 soak: build

@@ -180,7 +180,17 @@ std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelC
     for (float& v : signal) v *= scale;
   }
   const size_t broadcast_length = signal.size();
-  if (config.rt60 > 0.0) {
+  const RoomConfig& room = config.room;
+  const bool physical = room.HasSize();
+  size_t delay = 0;  // samples of the direct path
+  if (physical) {
+    Placement placement;
+    if (!PlaceInRoom(room, config.seed, &placement, nullptr)) return {};
+    if (room.phone_speaker) FilterInFrequency(&signal, config.output_rate, PhoneSpeakerGain);
+    signal =
+        Convolve(signal, RoomImpulseResponse(room, placement, config.output_rate, config.seed));
+    delay = static_cast<size_t>(std::lround(DirectPathSeconds(placement) * config.output_rate));
+  } else if (config.rt60 > 0.0) {
     signal = Convolve(signal, RoomImpulseResponse(config.rt60, config.direct_to_reverberant_db,
                                                   config.output_rate, config.seed));
   }
@@ -191,8 +201,9 @@ std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelC
       return 1.0 / std::sqrt(1.0 + std::pow(f / config.band_limit, 8.0));
     });
   }
-  const double signal_power =
-      Power(std::span<const float>(signal).first(std::min(broadcast_length, signal.size())));
+  const size_t arrival = std::min(delay, signal.size());
+  const double signal_power = Power(std::span<const float>(signal).subspan(
+      arrival, std::min(broadcast_length, signal.size() - arrival)));
 
   const size_t lead = static_cast<size_t>(std::lround(config.leading_silence * config.output_rate));
   const size_t trail =
@@ -211,12 +222,18 @@ std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelC
       mono[i] += gain * config.interference[i % config.interference.size()];
     }
   }
+  if (physical && room.phone_microphone) {
+    FilterInFrequency(&mono, config.output_rate, PhoneMicrophoneGain);
+    ApplyAgc(&mono, config.output_rate);
+  }
   if (config.gain_db != 0.0) {
     const float gain = static_cast<float>(std::pow(10.0, config.gain_db / 20.0));
     for (float& v : mono) v *= gain;
   }
-  if (config.clip > 0.0) {
-    const float limit = static_cast<float>(config.clip * 32767.0);
+  if (config.clip > 0.0 || physical) {
+    double fraction = config.clip > 0.0 ? config.clip : 1.0;
+    if (physical) fraction = std::min(fraction, 1.0);  // the microphone's full scale
+    const float limit = static_cast<float>(fraction * 32767.0);
     for (float& v : mono) v = std::clamp(v, -limit, limit);
   }
 

@@ -10,6 +10,14 @@
 // noise at a full-band SNR (signal power measured over the broadcast only,
 // noise power over the full band); mixed with an interfering recording;
 // amplified by `gain_db` and clipped. Deterministic for a given seed.
+//
+// With a physical room (`room` has a size) the room's model replaces the
+// exponential-noise one: the broadcast goes through the phone's loudspeaker
+// response, the room's impulse response for a placement drawn from the
+// seed (`level` is then the peak at 1 m on the loudspeaker's axis, the
+// direct path delays the broadcast by distance / 343 m/s), and after the
+// noise and interference through the microphone's response and AGC;
+// everything is clipped at full scale (or `clip` if lower).
 #ifndef SIM_CHANNEL_SIMULATOR_H_
 #define SIM_CHANNEL_SIMULATOR_H_
 
@@ -19,6 +27,7 @@
 #include <vector>
 
 #include "audio/audio_modem_encoder.h"
+#include "sim/room_model.h"
 
 namespace sorvel_sim {
 
@@ -53,10 +62,12 @@ struct ChannelConfig {
   // (looped to length), and its gain.
   std::vector<float> interference = {};
   double interference_gain_db = 0.0;
+  RoomConfig room = {};  // with a size: the physical room instead of rt60
 };
 
 // The received signal, channels interleaved, on the 16-bit scale (not
-// clipped or rounded).
+// rounded; clipped only as configured). Empty when the physical room fails
+// CheckRoom.
 std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelConfig& config);
 
 // Resamples a whole signal with a long windowed-sinc kernel that keeps

@@ -68,6 +68,7 @@ TrialResult RunTrial(const LinkSetup& setup, double snr_db, uint64_t seed) {
     if (decoder->DecodeTokens(&results, message_bytes, 2)) {
       // The first token counts, right or wrong.
       result.success = results.tokens[0].bytes == message;
+      result.wrong_token = !result.success;
       if (result.success) {
         result.first_token_seconds = (pos + size) / (rate * channel.channels);
       }
@@ -101,6 +102,7 @@ Curve EvaluateCurve(const LinkSetup& setup, const std::string& label,
         ++point.successes;
         point_first += t.first_token_seconds;
       }
+      point.wrong_tokens += t.wrong_token;
       if (progress) progress(++done, total);
     }
     if (point.successes > 0) point.mean_first_token_seconds = point_first / point.successes;
@@ -118,21 +120,67 @@ Curve EvaluateCurve(const LinkSetup& setup, const std::string& label,
   return curve;
 }
 
-std::string RenderSvg(const std::vector<Curve>& curves, const std::string& title) {
+Curve EvaluateDistances(const LinkSetup& setup, const std::string& label,
+                        const std::vector<double>& distances_m, double snr_db, int seeds,
+                        const std::function<void(int, int)>& progress) {
+  Curve curve;
+  curve.label = label;
+  double audio = 0.0, decode = 0.0, first_sum = 0.0;
+  int first_count = 0, done = 0;
+  const int total = static_cast<int>(distances_m.size()) * seeds;
+  for (double distance : distances_m) {
+    LinkSetup at = setup;
+    at.channel.room.distance = distance;
+    CurvePoint point{.snr_db = snr_db, .distance_m = distance};
+    double point_first = 0.0;
+    for (int s = 0; s < seeds; ++s) {
+      // The same trials (placements, messages, noise) for a distance
+      // whatever else is asked, and for every scheme.
+      const TrialResult t =
+          RunTrial(at, snr_db, 1000003ULL * static_cast<uint64_t>(distance * 1000) + s);
+      ++point.trials;
+      audio += t.audio_seconds;
+      decode += t.decode_seconds;
+      if (t.success) {
+        ++point.successes;
+        point_first += t.first_token_seconds;
+      }
+      point.wrong_tokens += t.wrong_token;
+      if (progress) progress(++done, total);
+    }
+    if (point.successes > 0) point.mean_first_token_seconds = point_first / point.successes;
+    first_sum += point_first;
+    first_count += point.successes;
+    curve.points.push_back(point);
+  }
+  if (first_count > 0) curve.mean_first_token_seconds = first_sum / first_count;
+  if (decode > 0.0) curve.real_time_factor = audio / decode;
+  return curve;
+}
+
+namespace {
+
+// Success rate against x_of(point), one polyline per curve, x ticks every
+// step_for(range of x); the x axis starts at 0 with `from_zero`.
+std::string RenderPlot(const std::vector<Curve>& curves, const std::string& title,
+                       const std::string& x_label,
+                       const std::function<double(const CurvePoint&)>& x_of,
+                       const std::function<double(double)>& step_for, bool from_zero) {
   constexpr double kWidth = 720, kHeight = 440, kLeft = 70, kRight = 180, kTop = 50,
                    kBottom = 60;
   double lo = 0, hi = 0;
   bool first = true;
   for (const Curve& c : curves) {
     for (const CurvePoint& p : c.points) {
-      lo = first ? p.snr_db : std::min(lo, p.snr_db);
-      hi = first ? p.snr_db : std::max(hi, p.snr_db);
+      lo = first ? x_of(p) : std::min(lo, x_of(p));
+      hi = first ? x_of(p) : std::max(hi, x_of(p));
       first = false;
     }
   }
+  if (from_zero) lo = std::min(lo, 0.0);
   if (hi <= lo) hi = lo + 1;
   const double plot_w = kWidth - kLeft - kRight, plot_h = kHeight - kTop - kBottom;
-  const auto x = [&](double snr) { return kLeft + (snr - lo) / (hi - lo) * plot_w; };
+  const auto x = [&](double value) { return kLeft + (value - lo) / (hi - lo) * plot_w; };
   const auto y = [&](double rate) { return kTop + (1.0 - rate) * plot_h; };
   static const char* kColors[] = {"#1f77b4", "#d62728", "#2ca02c", "#ff7f0e",
                                   "#9467bd", "#8c564b", "#17becf", "#7f7f7f"};
@@ -150,26 +198,28 @@ std::string RenderSvg(const std::vector<Curve>& curves, const std::string& title
         << "<text x=\"" << kLeft - 8 << "\" y=\"" << y(pct / 100.0) + 4
         << "\" text-anchor=\"end\">" << pct << " %</text>\n";
   }
-  const double step = (hi - lo) > 20 ? 5 : 2;
-  for (double snr = std::ceil(lo / step) * step; snr <= hi + 1e-9; snr += step) {
-    svg << "<line x1=\"" << x(snr) << "\" x2=\"" << x(snr) << "\" y1=\"" << kTop << "\" y2=\""
-        << kTop + plot_h << "\" stroke=\"#eee\"/>\n"
-        << "<text x=\"" << x(snr) << "\" y=\"" << kTop + plot_h + 18
-        << "\" text-anchor=\"middle\">" << snr << "</text>\n";
+  const double step = step_for(hi - lo);
+  for (double tick = std::ceil(lo / step - 1e-9) * step; tick <= hi + 1e-9; tick += step) {
+    svg << "<line x1=\"" << x(tick) << "\" x2=\"" << x(tick) << "\" y1=\"" << kTop
+        << "\" y2=\"" << kTop + plot_h << "\" stroke=\"#eee\"/>\n"
+        << "<text x=\"" << x(tick) << "\" y=\"" << kTop + plot_h + 18
+        << "\" text-anchor=\"middle\">" << tick << "</text>\n";
   }
   svg << "<rect x=\"" << kLeft << "\" y=\"" << kTop << "\" width=\"" << plot_w
       << "\" height=\"" << plot_h << "\" fill=\"none\" stroke=\"#333\"/>\n"
       << "<text x=\"" << kLeft + plot_w / 2 << "\" y=\"" << kHeight - 15
-      << "\" text-anchor=\"middle\">full-band SNR (dB)</text>\n"
+      << "\" text-anchor=\"middle\">" << x_label << "</text>\n"
       << "<text transform=\"rotate(-90)\" x=\"" << -(kTop + plot_h / 2) << "\" y=\"18\" "
       << "text-anchor=\"middle\">tokens decoded</text>\n";
   for (size_t i = 0; i < curves.size(); ++i) {
     const char* color = kColors[i % 8];
     svg << "<polyline fill=\"none\" stroke=\"" << color << "\" stroke-width=\"2\" points=\"";
-    for (const CurvePoint& p : curves[i].points) svg << x(p.snr_db) << "," << y(p.success_rate()) << " ";
+    for (const CurvePoint& p : curves[i].points) {
+      svg << x(x_of(p)) << "," << y(p.success_rate()) << " ";
+    }
     svg << "\"/>\n";
     for (const CurvePoint& p : curves[i].points) {
-      svg << "<circle cx=\"" << x(p.snr_db) << "\" cy=\"" << y(p.success_rate())
+      svg << "<circle cx=\"" << x(x_of(p)) << "\" cy=\"" << y(p.success_rate())
           << "\" r=\"3\" fill=\"" << color << "\"/>\n";
     }
     const double ly = kTop + 10 + 22 * static_cast<double>(i);
@@ -180,6 +230,21 @@ std::string RenderSvg(const std::vector<Curve>& curves, const std::string& title
   }
   svg << "</svg>\n";
   return svg.str();
+}
+
+}  // namespace
+
+std::string RenderSvg(const std::vector<Curve>& curves, const std::string& title) {
+  return RenderPlot(
+      curves, title, "full-band SNR (dB)", [](const CurvePoint& p) { return p.snr_db; },
+      [](double range) { return range > 20 ? 5.0 : 2.0; }, /*from_zero=*/false);
+}
+
+std::string RenderDistanceSvg(const std::vector<Curve>& curves, const std::string& title) {
+  return RenderPlot(
+      curves, title, "loudspeaker to microphone (m)",
+      [](const CurvePoint& p) { return p.distance_m; },
+      [](double range) { return range > 10 ? 2.0 : range > 4 ? 1.0 : 0.5; }, /*from_zero=*/true);
 }
 
 }  // namespace sorvel_sim

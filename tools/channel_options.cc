@@ -1,5 +1,8 @@
 #include "tools/channel_options.h"
 
+#include <cstdlib>
+#include <sstream>
+
 #include "tools/wav_io.h"
 
 namespace sorvel_cli {
@@ -27,6 +30,24 @@ void AddChannelOptions(CLI::App* command, ChannelOptions* o, bool single_values)
       ->capture_default_str()->group(group);
   command->add_option("--gain", c.gain_db, "Receiver gain before clipping, dB")
       ->capture_default_str()->group(group);
+  CLI::Option* room = command->add_option("--room", o->room,
+                      single_values
+                          ? "Physical room WxDxH in m, optionally :RT60 in s (else --rt60), "
+                            "e.g. 4x3x2.5:0.4"
+                          : "Physical rooms, comma-separated WxDxH[:RT60] (m, s), e.g. "
+                            "4x3x2.5:0.4,6x5x2.7:0.6; without :RT60 each --rt60 is used")
+      ->group(group);
+  command->add_option("--distance", c.room.distance, "With --room: loudspeaker to microphone, m")
+      ->capture_default_str()->needs(room)->group(group);
+  command->add_option("--source", o->source,
+                      "With --room: loudspeaker directivity (phone: -10 dB behind)")
+      ->check(CLI::IsMember({"omni", "phone"}))->capture_default_str()->needs(room)->group(group);
+  command->add_flag("--no-phone-speaker", o->no_phone_speaker,
+                    "With --room: an ideal loudspeaker instead of a phone's")
+      ->needs(room)->group(group);
+  command->add_flag("--no-phone-mic", o->no_phone_mic,
+                    "With --room: an ideal microphone (no roll-off, no AGC) instead of a phone's")
+      ->needs(room)->group(group);
   command->add_option("--mix", o->mix_file, "Interfering recording (e.g. speech) to mix in")
       ->group(group);
   command->add_option("--mix-gain", c.interference_gain_db,
@@ -34,8 +55,70 @@ void AddChannelOptions(CLI::App* command, ChannelOptions* o, bool single_values)
       ->capture_default_str()->group(group);
 }
 
+namespace {
+
+// The whole of `text` as a finite number.
+bool ParseNumber(const std::string& text, double* value) {
+  char* end = nullptr;
+  *value = std::strtod(text.c_str(), &end);
+  return !text.empty() && end == text.c_str() + text.size() && std::isfinite(*value);
+}
+
+std::string ParseRooms(const std::string& text, std::vector<RoomSpec>* rooms) {
+  std::stringstream in(text);
+  for (std::string item; std::getline(in, item, ',');) {
+    RoomSpec spec;
+    spec.text = item;
+    const std::string bad = "--room takes WxDxH[:RT60] in m and s, e.g. 4x3x2.5:0.4, not '" +
+                            item + "'";
+    const size_t colon = item.find(':');
+    if (colon != std::string::npos &&
+        (!ParseNumber(item.substr(colon + 1), &spec.rt60) || !(spec.rt60 > 0))) {
+      return bad;
+    }
+    const std::string size_text = item.substr(0, colon);
+    if (size_text.empty() || size_text.back() == 'x') return bad;
+    std::stringstream size(size_text);
+    std::vector<double> sizes;
+    for (std::string part; std::getline(size, part, 'x');) {
+      double v;
+      if (!ParseNumber(part, &v) || !(v > 0)) return bad;
+      sizes.push_back(v);
+    }
+    if (sizes.size() != 3) return bad;
+    spec.width = sizes[0], spec.depth = sizes[1], spec.height = sizes[2];
+    rooms->push_back(spec);
+  }
+  if (rooms->empty()) return "--room is empty";
+  return "";
+}
+
+}  // namespace
+
+std::string MakeRoom(const RoomSpec& spec, double rt60, const sorvel_sim::RoomConfig& base,
+                     sorvel_sim::RoomConfig* room) {
+  *room = base;
+  room->width = spec.width, room->depth = spec.depth, room->height = spec.height;
+  room->rt60 = std::isnan(spec.rt60) ? rt60 : spec.rt60;
+  if (!(room->rt60 > 0)) {
+    return "room " + spec.text + " needs an RT60: WxDxH:RT60 or --rt60";
+  }
+  if (std::string e = sorvel_sim::CheckRoom(*room); !e.empty()) {
+    return "room " + spec.text + ": " + e;
+  }
+  return "";
+}
+
 std::string ResolveChannelOptions(ChannelOptions& o) {
   o.config.noise = o.noise == "pink" ? sorvel_sim::NoiseKind::kPink : sorvel_sim::NoiseKind::kWhite;
+  o.config.room.source =
+      o.source == "phone" ? sorvel_sim::Directivity::kPhone : sorvel_sim::Directivity::kOmni;
+  o.config.room.phone_speaker = !o.no_phone_speaker;
+  o.config.room.phone_microphone = !o.no_phone_mic;
+  if (!o.room.empty()) {
+    if (std::string e = ParseRooms(o.room, &o.rooms); !e.empty()) return e;
+  }
+  if (!(o.config.room.distance > 0)) return "--distance must be positive";
   if (!(o.config.output_rate > 0)) return "--rate must be positive";
   if (o.config.rt60 < 0 || o.config.band_limit < 0 || o.config.clip < 0) {
     return "--rt60, --band-limit and --clip must not be negative";

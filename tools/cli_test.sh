@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
-# Command-line behaviour of `sorvel encode` and `sorvel decode`: refusals
-# exit with 2 and one line naming the problem; good tokens become WAV files
-# of the right length and decode back.
+# Command-line behaviour of `sorvel encode`, `decode`, `simulate` and
+# `eval`: refusals exit with 2 and one line naming the problem; good tokens
+# become WAV files of the right length and decode back.
 set -u
 sorvel=$1
 dir=$(mktemp -d)
@@ -68,5 +68,30 @@ tail -c +45 "$dir/pipe.wav" | "$sorvel" decode - --rate 44100 --crc --json |
 "$sorvel" eval --scheme dsss,dtmf --seeds 1 --snr-max 0 --snr-min 0 --plot "$dir/plot.svg" \
   2>/dev/null | grep -q "dtmf: lowest SNR with >= 95% success 0 dB" &&
   grep -q "<polyline" "$dir/plot.svg" || { echo "FAIL: eval"; failures=$((failures + 1)); }
+
+# A physical room: malformed or impossible rooms are refused with exit 2
+# and one line; a token gets through a small office.
+expect_simulate_refusal() {  # expect_simulate_refusal <text in message> <args...>
+  local text=$1; shift
+  local err
+  err=$("$sorvel" simulate --token 536f7276656c --crc "$@" 2>&1 >/dev/null)
+  local rc=$?
+  if [ $rc -ne 2 ] || [[ "$err" != *"$text"* ]]; then
+    echo "FAIL: simulate $* -> rc $rc, '$err' (wanted rc 2 and '$text')"
+    failures=$((failures + 1))
+  fi
+}
+expect_simulate_refusal "takes WxDxH" --room 4x3
+expect_simulate_refusal "takes WxDxH" --room 4x0x2.5:0.4
+expect_simulate_refusal "takes WxDxH" --room 4x3x2.5:fast
+expect_simulate_refusal "needs an RT60" --room 4x3x2.5
+expect_simulate_refusal "does not fit" --room 4x3x2.5:0.4 --distance 6
+expect_simulate_refusal "requires --room" --distance 2
+"$sorvel" simulate --token 536f7276656c --crc --seconds 2 --snr 10 --room 4x3x2.5:0.4 \
+  --distance 1.5 --source phone | grep -q 536f7276656c ||
+  { echo "FAIL: simulate --room"; failures=$((failures + 1)); }
+"$sorvel" eval --scheme dsss --seeds 1 --room 4x3x2.5:0.4 --distances 1 --plot "$dir/rooms.svg" \
+  2>/dev/null | grep -q "1.00 m *1/1 (100%)" &&
+  grep -q "<polyline" "$dir/rooms.svg" || { echo "FAIL: eval --distances"; failures=$((failures + 1)); }
 
 exit $((failures > 0))
