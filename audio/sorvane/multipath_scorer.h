@@ -1,25 +1,32 @@
 // Symbol scores of DSSS frames gathered over a room's multipath.
 //
-// In a room most of the energy that reaches the microphone arrives after
-// the direct path: reflections and a diffuse tail spread each frame over
-// tens of milliseconds of lags. This scorer estimates the channel of every
-// frame as its code correlation over a window of lags (from `lead` before
-// to `span` after the frame start), averaged over the frame and its
+// In a room most of the energy that reaches a microphone a few metres away
+// arrives after the direct path: reflections and a diffuse tail spread each
+// frame over tens of milliseconds of lags, and scoring symbols at one lag
+// throws that energy away. This scorer follows one transmission as a track:
+// a frame grid (an anchor frame start and the frame period) and a Doppler
+// offset, searched once per track. For every frame on the grid it estimates
+// the channel as the code correlation over a window of lags (from `lead`
+// before to `span` after the frame start), averaged over the frame and its
 // neighbours, and combines the lags by that estimate before scoring the
-// symbol tones (a rake with maximal-ratio weights). Lags whose estimate does
-// not stand out of its frame-to-frame scatter get no weight, so that in a
-// quiet, dry channel the scorer reduces to scoring at the strongest lag.
+// symbol tones (a rake with maximal-ratio weights). A lag whose estimate
+// does not stand out of its frame-to-frame scatter gets no weight, so in a
+// dry, noisy channel the scorer reduces to scoring at the strongest lag.
 //
-// Inputs are the decoder's complex baseband (real and imaginary parts);
-// frame starts are indices into them. Doppler offsets are in carrier cycles
-// per frame. Not thread safe: it keeps FFT scratch. Size mismatches end the
-// process through CHECK.
+// Positions are absolute stream indices of the decoder's complex baseband
+// (real and imaginary parts); the caller passes the buffered span together
+// with the absolute index of its first sample. Doppler offsets are in
+// carrier cycles per frame. Not thread safe: it keeps FFT scratch and
+// per-frame caches. Out-of-buffer reads and bad parameters end the process
+// through CHECK.
 #ifndef AUDIO_SORVANE_MULTIPATH_SCORER_H_
 #define AUDIO_SORVANE_MULTIPATH_SCORER_H_
 
 #include <complex>
-#include <memory>
+#include <cstdint>
+#include <map>
 #include <span>
+#include <utility>
 #include <vector>
 
 #include "audio/dsp/eigen_types.h"
@@ -29,38 +36,55 @@
 namespace audio_sorvane {
 
 struct MultipathScorerParams {
-  int lead = 147;            // lags before the frame start, baseband samples
-  int span = 294;            // lags after it
-  int channel_frames = 2;    // neighbours on each side averaged into the channel
-  float gate = 3.0f;         // a lag counts when its power exceeds gate x its scatter
-  float max_doppler = 2.35f;     // cycles per frame searched on each side of 0
-  float doppler_step = 0.15f;    // finest Doppler step, cycles per frame
-  int doppler_frames = 4;        // frames integrated coherently by the Doppler search
+  int lead = 147;              // lags before the frame start, baseband samples (>= 0)
+  int span = 294;              // lags after it (>= 0)
+  int channel_frames = 4;      // neighbours on each side averaged into the channel (>= 0)
+  float gate = 10.0f;          // a lag counts when its power exceeds gate x its scatter
+  float max_doppler = 2.35f;   // searched on each side of 0, cycles per frame (>= 0)
+  float doppler_step = 0.15f;  // finest Doppler step, cycles per frame (> 0)
+  int doppler_frames = 4;      // frames whose powers the Doppler search sums (>= 1)
+};
+
+// A view of the buffered baseband: samples real[i] + j imag[i] have the
+// absolute stream index origin + i.
+struct BasebandView {
+  std::span<const float> real;
+  std::span<const float> imag;
+  int64_t origin = 0;
 };
 
 class MultipathScorer {
  public:
   MultipathScorer(const SymbolWaveCoder& coder, const MultipathScorerParams& params);
 
-  // True when the lag window of the frame starting at `t` lies within a
-  // buffer of `size` samples.
-  bool HasWindow(int t, int size) const {
-    return t - params_.lead >= 0 && t + frame_size_ + params_.span <= size;
-  }
+  // True when the lag window of a frame starting at absolute index `start`
+  // lies in the view.
+  bool HasWindow(const BasebandView& view, int64_t start) const;
 
-  // The Doppler offset that gathers the most peaky multipath energy over
-  // up to doppler_frames frames from `t` on (at least the frame at t must
-  // have its window). `origin` is t's absolute stream index, which fixes
-  // the phase reference.
-  float EstimateDoppler(std::span<const float> real, std::span<const float> imag, int t,
-                        int64_t origin);
+  // The Doppler offset that gathers the most peaky multipath energy over up
+  // to doppler_frames frames from `start` on (whose own window must be in
+  // the view).
+  float SearchDoppler(const BasebandView& view, int64_t start);
 
-  // Scores of every symbol for the frame at `t` (absolute index `origin`),
-  // its neighbours at t + round(j * period). False when its own window is
-  // not in the buffer. `complete` tells whether every later neighbour was
-  // available (the score will not change with more audio).
-  bool Score(std::span<const float> real, std::span<const float> imag, int t, int64_t origin,
-             double period, float doppler, audio_dsp::FloatVector* scores, bool* complete);
+  // Follows a new transmission: frame k starts at anchor + round(k * period)
+  // with the period that `doppler` implies. Forgets every cached frame.
+  void StartTrack(int64_t anchor, float doppler);
+  // Forgets the track and every cached frame.
+  void Reset();
+  bool has_track() const { return has_track_; }
+  float doppler() const { return doppler_; }
+  double period() const { return period_; }
+  int64_t FrameStart(int64_t k) const;
+  // The grid index nearest to absolute index `start`.
+  int64_t NearestFrame(int64_t start) const;
+
+  // Scores of every symbol for grid frame k. False when its window, or the
+  // window of any later neighbour, is not in the view yet (the score would
+  // change with more audio). Frames are cached, so each is scored once.
+  bool Score(const BasebandView& view, int64_t k, audio_dsp::FloatVector* scores);
+
+  // Drops what is cached for frames before grid index k.
+  void ForgetBefore(int64_t k);
 
   // The frame period (baseband samples) of a sender whose carrier is
   // shifted by `doppler` cycles per frame: motion scales time as it scales
@@ -68,27 +92,56 @@ class MultipathScorer {
   double Period(float doppler) const;
 
  private:
-  // The code correlation over the lag window of the frame at t, the
-  // baseband derotated by `doppler` with phase zero at absolute index
-  // `phase_origin`. Keeps the window's spectrum in spectrum_ when asked.
-  void Profile(std::span<const float> real, std::span<const float> imag, int t,
-               int64_t absolute, float doppler, bool keep_spectrum,
-               std::vector<std::complex<float>>* profile);
+  struct Frame {
+    std::vector<std::complex<float>> profile;  // code correlation per lag
+    std::vector<std::complex<float>> window;    // derotated, until scored
+    std::vector<std::complex<float>> spectrum;  // the window's, until scored
+    bool scored = false;
+    audio_dsp::FloatVector scores;
+  };
+  // Fills the profile of the frame at `start` (and keeps its window and the
+  // window's spectrum when asked) from the view: the baseband derotated by
+  // the offset of rotation_, correlated with the code.
+  void Transform(const BasebandView& view, int64_t start, bool keep_window, Frame* frame);
+  Frame& CachedFrame(const BasebandView& view, int64_t k);
+  // Writes the window of a frame starting at `start`, derotated by the
+  // Doppler offset of rotation_ with phase zero at stream index 0, to
+  // buffer_.
+  void Derotate(const BasebandView& view, int64_t start);
+  // Fills rotation_ for a Doppler offset.
+  void SetRotation(float doppler);
+  // combined_[i] = sum_m conj(weights_[m]) x[i + m], i < frame size, where x
+  // is the frame's derotated window.
+  void Combine(const Frame& frame);
 
   MultipathScorerParams params_;
   int frame_size_;
   int lags_;
+  int window_;
   float carrier_cycles_per_frame_;
   bool use_quadrature_;
   std::vector<float> code_;
   audio_dsp::FloatMatrix tones_;
   audio_dsp::ComplexFFTTransformer fft_;
   std::vector<std::complex<float>> code_spectrum_;  // conjugated
+
+  bool has_track_ = false;
+  int64_t anchor_ = 0;
+  float doppler_ = 0.0f;
+  double period_ = 0.0;
+  std::map<int64_t, Frame> frames_;  // by grid index
+
   // Scratch.
   std::vector<std::complex<float>> buffer_;
   std::vector<std::complex<float>> spectrum_;
-  std::vector<std::vector<std::complex<float>>> profiles_;
   std::vector<std::complex<float>> channel_;
+  std::vector<std::complex<float>> weights_;
+  std::vector<std::complex<float>> combined_;
+  std::vector<double> power_;
+  float rotation_doppler_ = 0.0f;
+  std::vector<std::complex<float>> rotation_;  // exp(-2 pi j doppler i / frame size)
+  std::vector<std::pair<const std::complex<float>*, std::complex<float>>> neighbours_;
+  Frame search_frame_;
   audio_dsp::FloatVector real_part_;
 };
 

@@ -4,7 +4,6 @@
 #include <cmath>
 #include <numbers>
 #include <utility>
-#include <cstdlib>
 
 #include "audio/dsp/box_filter.h"
 #include "audio/dsp/number_util.h"
@@ -76,8 +75,7 @@ SorvaneDecoder::SorvaneDecoder(std::shared_ptr<const SymbolWaveCoder> symbol_wav
     multipath.lead = static_cast<int>(std::lround(params_.multipath_lead * baseband_rate_));
     multipath.span = static_cast<int>(std::lround(params_.multipath_span * baseband_rate_));
     multipath.channel_frames = params_.channel_frames;
-    multipath.gate = getenv("GATE") ? atof(getenv("GATE")) : params_.channel_gate;
-    if (getenv("CF")) multipath.channel_frames = atoi(getenv("CF"));
+    multipath.gate = params_.channel_gate;
     multipath.max_doppler = max_doppler_;
     multipath.doppler_step = params_.symbol_frequency_step;
     multipath_ = std::make_unique<MultipathScorer>(*coder_, multipath);
@@ -124,7 +122,7 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
   num_scored_ = 0;
   samples_processed_ = 0;
   symbol_score_cache_.clear();
-  doppler_cache_.clear();
+  if (multipath_ != nullptr) multipath_->Reset();
   initialized_ = true;
 }
 
@@ -136,7 +134,7 @@ void SorvaneDecoder::ResetStream() {
   smoothing_filter_->Reset();
   scorer_->ZeroHistory();
   symbol_score_cache_.clear();
-  doppler_cache_.clear();
+  if (multipath_ != nullptr) multipath_->Reset();
 }
 
 void SorvaneDecoder::WipeInternalData() {
@@ -177,8 +175,6 @@ void SorvaneDecoder::ProcessSamples(std::span<const float> received_samples) {
     const int first_kept = extension_ + baseband_real_.num_discarded_samples();
     symbol_score_cache_.erase(symbol_score_cache_.begin(),
                               symbol_score_cache_.lower_bound(first_kept));
-    doppler_cache_.erase(doppler_cache_.begin(),
-                         doppler_cache_.lower_bound(baseband_real_.num_discarded_samples()));
   }
 
   if (num_channels_ == 1) {
@@ -324,10 +320,13 @@ void SorvaneDecoder::ScoreGroupOverMultipath(const DecodingGroup& group,
   // others are the same frame seen through other paths).
   struct SlotFrame {
     int slot;
-    int start;
+    int64_t start;  // absolute
     float score;
   };
+  const int64_t discarded = baseband_real_.num_discarded_samples();
+  const BasebandView view{baseband_real_.View(0), baseband_imaginary_.View(0), discarded};
   std::vector<SlotFrame> frames;
+  const SlotFrame* reference = nullptr;
   const std::vector<int>& times = group.times();
   for (size_t i = 0; i < times.size();) {
     const int slot = group.SlotOf(times[i]);
@@ -335,53 +334,31 @@ void SorvaneDecoder::ScoreGroupOverMultipath(const DecodingGroup& group,
     for (; i < times.size() && group.SlotOf(times[i]) == slot; ++i) {
       if (filtered[times[i]] > filtered[times[best]]) best = i;
     }
-    frames.push_back({slot, RefinePeak(times[best]), filtered[times[best]]});
+    frames.push_back({slot, discarded + RefinePeak(times[best]), filtered[times[best]]});
   }
-  // The Doppler offset is searched once, at a reference frame: one whose
-  // offset is known already if there is one, else the strongest.
-  const int size = baseband_real_.size();
-  const int discarded = baseband_real_.num_discarded_samples();
-  const SlotFrame* reference = nullptr;
-  bool known = false;
   for (const SlotFrame& frame : frames) {
-    if (!multipath_->HasWindow(frame.start, size)) continue;
-    const bool cached = doppler_cache_.count(discarded + frame.start) > 0;
-    if (reference == nullptr || (cached && !known) ||
-        (cached == known && frame.score > reference->score)) {
-      reference = &frame;
-      known = cached;
-    }
+    if (!multipath_->HasWindow(view, frame.start)) continue;
+    if (reference == nullptr || frame.score > reference->score) reference = &frame;
   }
   if (reference == nullptr) return;
-  const int reference_absolute = discarded + reference->start;
-  float doppler;
-  if (known) {
-    doppler = doppler_cache_[reference_absolute];
-  } else {
-    doppler = multipath_->EstimateDoppler(baseband_real_.View(0), baseband_imaginary_.View(0),
-                                          reference->start, reference_absolute);
-    doppler_cache_[reference_absolute] = doppler;
+  // The group continues the current track when its strongest frame lies on
+  // the track's grid; otherwise it starts a new one with its own Doppler
+  // search.
+  const int64_t tolerance = std::lround(params_.max_phase_error * frame_size_);
+  if (!multipath_->has_track() ||
+      std::abs(reference->start -
+               multipath_->FrameStart(multipath_->NearestFrame(reference->start))) > tolerance) {
+    multipath_->StartTrack(reference->start,
+                           multipath_->SearchDoppler(view, reference->start));
   }
-  // The frames lie on the grid the Doppler offset implies; scores are kept
-  // once no later audio can change them.
-  const double period = multipath_->Period(doppler);
   FloatVector scores;
   for (const SlotFrame& frame : frames) {
-    const int start = reference->start +
-                      static_cast<int>(std::lround((frame.slot - reference->slot) * period));
-    const int absolute = discarded + start;
-    if (auto cached = symbol_score_cache_.find(absolute); cached != symbol_score_cache_.end()) {
-      symbol_scores->emplace(frame.slot, cached->second);
-      continue;
+    if (multipath_->Score(view, multipath_->NearestFrame(frame.start), &scores)) {
+      symbol_scores->emplace(frame.slot, scores);
     }
-    bool complete = false;
-    if (!multipath_->Score(baseband_real_.View(0), baseband_imaginary_.View(0), start, absolute,
-                           period, doppler, &scores, &complete)) {
-      continue;
-    }
-    if (complete) symbol_score_cache_.emplace(absolute, scores);
-    symbol_scores->emplace(frame.slot, scores);
   }
+  // Frames that start before the buffer will not be asked for again.
+  multipath_->ForgetBefore(multipath_->NearestFrame(discarded) - params_.channel_frames);
 }
 
 int SorvaneDecoder::RefinePeak(int t) const {

@@ -167,7 +167,6 @@ class SorvaneDecoder {
   int64_t samples_processed_ = 0;
   std::map<int, audio_dsp::FloatVector> symbol_score_cache_;
   std::unique_ptr<MultipathScorer> multipath_;
-  std::map<int, float> doppler_cache_;  // absolute frame start -> Doppler
 
   // Scratch, kept to avoid allocation per block.
   std::vector<float> mono_;
