@@ -18,16 +18,37 @@ int FastSizeAtLeast(int n) {
 // NaN fallback that keeps these loops scalar and branchy.
 using Complex = std::complex<float>;
 
-// sum_m conj(a[m]) b[m].
+// sum_m conj(a[m]) b[m], in eight independent partial sums so that the
+// compiler may keep them in vector registers.
 Complex InnerProduct(const Complex* a, const Complex* b, int n) {
   const float* x = reinterpret_cast<const float*>(a);
   const float* y = reinterpret_cast<const float*>(b);
-  float re = 0.0f, im = 0.0f;
-  for (int i = 0; i < 2 * n; i += 2) {
-    re += x[i] * y[i] + x[i + 1] * y[i + 1];
-    im += x[i] * y[i + 1] - x[i + 1] * y[i];
+  float re[4] = {}, im[4] = {};
+  int i = 0;
+  for (; i + 4 <= n; i += 4) {
+    for (int u = 0; u < 4; ++u) {
+      const int k = 2 * (i + u);
+      re[u] += x[k] * y[k] + x[k + 1] * y[k + 1];
+      im[u] += x[k] * y[k + 1] - x[k + 1] * y[k];
+    }
   }
-  return {re, im};
+  for (; i < n; ++i) {
+    re[0] += x[2 * i] * y[2 * i] + x[2 * i + 1] * y[2 * i + 1];
+    im[0] += x[2 * i] * y[2 * i + 1] - x[2 * i + 1] * y[2 * i];
+  }
+  return {(re[0] + re[1]) + (re[2] + re[3]), (im[0] + im[1]) + (im[2] + im[3])};
+}
+
+// sum_m |a[m]|^2.
+float Energy(const Complex* a, int n) {
+  const float* x = reinterpret_cast<const float*>(a);
+  float sum[8] = {};
+  int i = 0;
+  for (; i + 8 <= 2 * n; i += 8) {
+    for (int u = 0; u < 8; ++u) sum[u] += x[i + u] * x[i + u];
+  }
+  for (; i < 2 * n; ++i) sum[0] += x[i] * x[i];
+  return ((sum[0] + sum[1]) + (sum[2] + sum[3])) + ((sum[4] + sum[5]) + (sum[6] + sum[7]));
 }
 
 // out[m] += a[m] * c.
@@ -39,20 +60,6 @@ void AddScaled(const Complex* a, Complex c, Complex* out, int n) {
     y[i] += x[i] * cr - x[i + 1] * ci;
     y[i + 1] += x[i] * ci + x[i + 1] * cr;
   }
-}
-
-// sum_m |a[m] * c - b[m]|^2.
-float Distance(const Complex* a, Complex c, const Complex* b, int n) {
-  const float* x = reinterpret_cast<const float*>(a);
-  const float* y = reinterpret_cast<const float*>(b);
-  const float cr = c.real(), ci = c.imag();
-  float sum = 0.0f;
-  for (int i = 0; i < 2 * n; i += 2) {
-    const float re = x[i] * cr - x[i + 1] * ci - y[i];
-    const float im = x[i] * ci + x[i + 1] * cr - y[i + 1];
-    sum += re * re + im * im;
-  }
-  return sum;
 }
 
 // a[m] *= b[m] (or conj(b[m])).
@@ -192,7 +199,59 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
   // Powers summed over frames (their phases are not trusted at low SNR),
   // then the sum of squares, which rewards energy gathered into peaks over
   // energy smeared across lags by a wrong offset.
-  const auto peakiness = [&](float doppler) {
+  const auto peakiness = [&]() {
+    double sum = 0.0;
+    for (double p : power_) sum += p * p;
+    return sum;
+  };
+  const auto add_power = [&](const std::vector<std::complex<float>>& profile) {
+    const float* p = reinterpret_cast<const float*>(profile.data());
+    for (int m = 0; m < lags_; ++m) power_[m] += p[2 * m] * p[2 * m] + p[2 * m + 1] * p[2 * m + 1];
+  };
+  float best = 0.0f;
+  double best_value = -1.0;
+  const auto consider = [&](float doppler, double value) {
+    if (value > best_value) {
+      best_value = value;
+      best = doppler;
+    }
+  };
+
+  // Coarse grid: offsets of whole FFT bins, which shift the spectrum of the
+  // window instead of derotating it, so each frame is transformed once. A
+  // bin is about two thirds of a cycle per frame, where a half-bin error
+  // still keeps most of the power. Frames are taken a nominal period apart.
+  const int n = fft_.GetSize();
+  const float bin = static_cast<float>(frame_size_) / static_cast<float>(n);
+  const int bins = static_cast<int>(std::floor(params_.max_doppler / bin + 0.5f));
+  std::vector<std::vector<std::complex<float>>>& spectra = search_spectra_;
+  spectra.resize(params_.doppler_frames);
+  int frames = 0;
+  SetRotation(0.0f);
+  for (int j = 0; j < params_.doppler_frames; ++j) {
+    const int64_t frame_start = start + static_cast<int64_t>(j) * frame_size_;
+    if (!HasWindow(view, frame_start)) break;
+    Transform(view, frame_start, true, &search_frame_);
+    spectra[j].swap(search_frame_.spectrum);
+    ++frames;
+  }
+  for (int b = -bins; b <= bins; ++b) {
+    std::fill(power_.begin(), power_.end(), 0.0);
+    for (int j = 0; j < frames; ++j) {
+      // Derotating by b bins takes bin k + b to bin k.
+      for (int k = 0; k < n; ++k) spectrum_[k] = spectra[j][(k + b + n) % n];
+      Multiply(spectrum_.data(), code_spectrum_.data(), n, false);
+      fft_.Inverse(spectrum_.data(), buffer_.data());
+      search_frame_.profile.assign(buffer_.begin(), buffer_.begin() + lags_);
+      add_power(search_frame_.profile);
+    }
+    consider(std::clamp(b * bin, -params_.max_doppler, params_.max_doppler), peakiness());
+  }
+
+  // Two refinements around the best, derotated exactly, the frames a
+  // period of that offset apart.
+  const auto evaluate = [&](float doppler) {
+    if (std::fabs(doppler) > params_.max_doppler * (1.0f + 1e-6f)) return;
     SetRotation(doppler);
     std::fill(power_.begin(), power_.end(), 0.0);
     const double period = Period(doppler);
@@ -200,34 +259,17 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
       const int64_t frame_start = start + std::llround(j * period);
       if (!HasWindow(view, frame_start)) break;
       Transform(view, frame_start, false, &search_frame_);
-      const float* p = reinterpret_cast<const float*>(search_frame_.profile.data());
-      for (int m = 0; m < lags_; ++m) power_[m] += p[2 * m] * p[2 * m] + p[2 * m + 1] * p[2 * m + 1];
+      add_power(search_frame_.profile);
     }
-    double sum = 0.0;
-    for (double p : power_) sum += p * p;
-    return sum;
+    consider(doppler, peakiness());
   };
-  float best = 0.0f;
-  double best_value = -1.0;
-  const auto consider = [&](float doppler) {
-    if (std::fabs(doppler) > params_.max_doppler * (1.0f + 1e-6f)) return;
-    const double value = peakiness(doppler);
-    if (value > best_value) {
-      best_value = value;
-      best = doppler;
-    }
-  };
-  // A coarse grid (a quarter-cycle of phase error over a frame at most
-  // costs little), then two refinements around its best.
-  const float coarse = 4.0f * params_.doppler_step;
-  const int steps = static_cast<int>(std::ceil(params_.max_doppler / coarse));
-  for (int i = -steps; i <= steps; ++i) {
-    consider(std::clamp(i * coarse, -params_.max_doppler, params_.max_doppler));
-  }
-  for (float step : {2.0f * params_.doppler_step, params_.doppler_step}) {
+  best_value = -1.0;
+  const float coarse_best = best;
+  evaluate(coarse_best);
+  for (float step : {bin / 2.0f, params_.doppler_step}) {
     const float centre = best;
-    consider(centre - step);
-    consider(centre + step);
+    evaluate(centre - step);
+    evaluate(centre + step);
   }
   return best;
 }
@@ -283,27 +325,38 @@ bool MultipathScorer::Score(const BasebandView& view, int64_t k, audio_dsp::Floa
   // from frame to frame), averaged. Earlier neighbours whose audio is gone
   // and were never seen are left out.
   Frame& own = CachedFrame(view, k);
-  channel_.assign(lags_, {});
   neighbours_.clear();
+  power_.assign(lags_, 0.0);
   for (int j = -neighbours; j <= neighbours; ++j) {
     const auto it = frames_.find(k + j);
     const bool cached = it != frames_.end() && !it->second.profile.empty();
     if (!cached && !HasWindow(view, FrameStart(k + j))) continue;
     const Complex* p = CachedFrame(view, k + j).profile.data();
-    const Complex align = Direction(InnerProduct(p, own.profile.data(), lags_));
+    for (int m = 0; m < lags_; ++m) power_[m] += std::norm(p[m]);
+    neighbours_.push_back({p, Complex(1.0f)});
+  }
+  // The frames are phase-aligned to the frame's own profile weighted by the
+  // lag powers of all of them: at low SNR the strong lags decide the
+  // alignment, not the noise of hundreds of empty ones.
+  reference_.resize(lags_);
+  for (int m = 0; m < lags_; ++m) reference_[m] = own.profile[m] * static_cast<float>(power_[m]);
+  channel_.assign(lags_, {});
+  for (auto& [p, align] : neighbours_) {
+    align = Direction(InnerProduct(p, reference_.data(), lags_));
     AddScaled(p, align, channel_.data(), lags_);
-    neighbours_.push_back({p, align});
   }
   const int count = static_cast<int>(neighbours_.size());
   for (auto& v : channel_) v /= static_cast<float>(count);
   // The scatter of the aligned profiles around their average, per lag,
   // estimates the noise power of the average. With one frame no lag can be
   // judged and all keep their weight.
+  // (The squared distances of the profiles from their mean sum to their
+  // energies less count times the mean's.)
   double scatter = 0.0;
   if (count > 1) {
-    for (const auto& [p, align] : neighbours_) {
-      scatter += Distance(p, align, channel_.data(), lags_);
-    }
+    double energy = 0.0;
+    for (const auto& [p, align] : neighbours_) energy += Energy(p, lags_);
+    scatter = std::max(0.0, energy - count * static_cast<double>(Energy(channel_.data(), lags_)));
     scatter /= static_cast<double>(lags_) * (count - 1) * count;
   }
 

@@ -36,8 +36,8 @@
 namespace audio_sorvane {
 
 struct MultipathScorerParams {
-  int lead = 147;              // lags before the frame start, baseband samples (>= 0)
-  int span = 294;              // lags after it (>= 0)
+  int lead = 100;              // lags before the frame start, baseband samples (>= 0)
+  int span = 235;              // lags after it (>= 0)
   int channel_frames = 4;      // neighbours on each side averaged into the channel (>= 0)
   float gate = 10.0f;          // a lag counts when its power exceeds gate x its scatter
   float max_doppler = 2.35f;   // searched on each side of 0, cycles per frame (>= 0)
@@ -135,6 +135,7 @@ class MultipathScorer {
   std::vector<std::complex<float>> buffer_;
   std::vector<std::complex<float>> spectrum_;
   std::vector<std::complex<float>> channel_;
+  std::vector<std::complex<float>> reference_;
   std::vector<std::complex<float>> weights_;
   std::vector<std::complex<float>> combined_;
   std::vector<double> power_;
@@ -142,6 +143,7 @@ class MultipathScorer {
   std::vector<std::complex<float>> rotation_;  // exp(-2 pi j doppler i / frame size)
   std::vector<std::pair<const std::complex<float>*, std::complex<float>>> neighbours_;
   Frame search_frame_;
+  std::vector<std::vector<std::complex<float>>> search_spectra_;
   audio_dsp::FloatVector real_part_;
 };
 
