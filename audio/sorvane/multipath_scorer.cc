@@ -274,13 +274,16 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
   return best;
 }
 
+bool MultipathScorer::Sounded(int64_t k) { return k % kSoundingInterval == 0; }
+
 MultipathScorer::Frame& MultipathScorer::CachedFrame(const BasebandView& view, int64_t k) {
   Frame& frame = frames_[k];
   if (frame.profile.empty()) Transform(view, FrameStart(k), !frame.scored, &frame);
   return frame;
 }
 
-void MultipathScorer::Combine(const Frame& frame) {
+void MultipathScorer::Combine(const std::vector<std::complex<float>>& window,
+                              std::vector<std::complex<float>>* spectrum) {
   // Few weighted lags (a dry room) are cheaper to combine directly than
   // through two transforms.
   constexpr int kMaxDirectLags = 32;
@@ -290,16 +293,22 @@ void MultipathScorer::Combine(const Frame& frame) {
   if (weighted <= kMaxDirectLags) {
     for (int m = 0; m < lags_; ++m) {
       if (weights_[m] == Complex()) continue;
-      AddScaled(frame.window.data() + m, std::conj(weights_[m]), combined_.data(), frame_size_);
+      AddScaled(window.data() + m, std::conj(weights_[m]), combined_.data(), frame_size_);
     }
     return;
   }
   const int n = fft_.GetSize();
+  if (spectrum->empty()) {
+    std::fill(buffer_.begin(), buffer_.end(), std::complex<float>());
+    std::copy(window.begin(), window.end(), buffer_.begin());
+    spectrum->resize(n);
+    fft_.Forward(buffer_.data(), spectrum->data());
+  }
   std::fill(buffer_.begin(), buffer_.end(), std::complex<float>());
   std::copy(weights_.begin(), weights_.end(), buffer_.begin());
   fft_.Forward(buffer_.data(), spectrum_.data());
   for (int k = 0; k < n; ++k) spectrum_[k] = std::conj(spectrum_[k]);
-  Multiply(spectrum_.data(), frame.spectrum.data(), n, false);
+  Multiply(spectrum_.data(), spectrum->data(), n, false);
   fft_.Inverse(spectrum_.data(), buffer_.data());
   std::copy_n(buffer_.begin(), frame_size_, combined_.begin());
 }
@@ -312,34 +321,45 @@ bool MultipathScorer::Score(const BasebandView& view, int64_t k, audio_dsp::Floa
     return true;
   }
   const int neighbours = params_.channel_frames;
+  const auto has_profile = [&](int64_t i) {
+    const auto it = frames_.find(i);
+    return it != frames_.end() && !it->second.profile.empty();
+  };
   for (int j = 0; j <= neighbours; ++j) {
     const int64_t later = k + j;
-    const auto it = frames_.find(later);
-    if ((it == frames_.end() || it->second.profile.empty()) &&
-        !HasWindow(view, FrameStart(later))) {
-      return false;
-    }
+    if (!Sounded(later) && j > 0) continue;
+    if (!has_profile(later) && !HasWindow(view, FrameStart(later))) return false;
   }
   // Channel estimate: the profiles of the frame and its neighbours, each
   // phase-aligned to the frame's own (a residual Doppler error turns them
   // from frame to frame), averaged. Earlier neighbours whose audio is gone
   // and were never seen are left out.
-  Frame& own = CachedFrame(view, k);
+  Frame& own = frames_[k];
+  if (own.window.empty()) {
+    if (!HasWindow(view, FrameStart(k))) return false;
+    Derotate(view, FrameStart(k));
+    own.window.assign(buffer_.begin(), buffer_.begin() + window_);
+  }
   neighbours_.clear();
   power_.assign(lags_, 0.0);
+  const Complex* nearest = nullptr;
+  int64_t nearest_distance = 0;
   for (int j = -neighbours; j <= neighbours; ++j) {
-    const auto it = frames_.find(k + j);
-    const bool cached = it != frames_.end() && !it->second.profile.empty();
-    if (!cached && !HasWindow(view, FrameStart(k + j))) continue;
+    if (!Sounded(k + j)) continue;
+    if (!has_profile(k + j) && !HasWindow(view, FrameStart(k + j))) continue;
     const Complex* p = CachedFrame(view, k + j).profile.data();
     for (int m = 0; m < lags_; ++m) power_[m] += std::norm(p[m]);
     neighbours_.push_back({p, Complex(1.0f)});
+    if (nearest == nullptr || std::abs(j) < nearest_distance) {
+      nearest = p;
+      nearest_distance = std::abs(j);
+    }
   }
-  // The frames are phase-aligned to the frame's own profile weighted by the
+  // The frames are phase-aligned to the nearest one's profile weighted by the
   // lag powers of all of them: at low SNR the strong lags decide the
   // alignment, not the noise of hundreds of empty ones.
   reference_.resize(lags_);
-  for (int m = 0; m < lags_; ++m) reference_[m] = own.profile[m] * static_cast<float>(power_[m]);
+  for (int m = 0; m < lags_; ++m) reference_[m] = nearest[m] * static_cast<float>(power_[m]);
   channel_.assign(lags_, {});
   for (auto& [p, align] : neighbours_) {
     align = Direction(InnerProduct(p, reference_.data(), lags_));
@@ -378,7 +398,7 @@ bool MultipathScorer::Score(const BasebandView& view, int64_t k, audio_dsp::Floa
     w[2 * m + 1] = h[2 * m + 1] * weight;
   }
   weights_[strongest] = channel_[strongest];
-  Combine(own);
+  Combine(own.window, &own.spectrum);
 
   // Despread the combined frame, put its pedestal on the real axis and
   // correlate with the symbol tones.

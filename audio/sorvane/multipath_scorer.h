@@ -111,8 +111,15 @@ class MultipathScorer {
   // Fills rotation_ for a Doppler offset.
   void SetRotation(float doppler);
   // combined_[i] = sum_m conj(weights_[m]) x[i + m], i < frame size, where x
-  // is the frame's derotated window.
-  void Combine(const Frame& frame);
+  // is a frame's derotated window; its spectrum is filled in when empty and
+  // needed.
+  void Combine(const std::vector<std::complex<float>>& window,
+               std::vector<std::complex<float>>* spectrum);
+  // The channel is sounded (its lag profile computed) on every other frame
+  // of the grid: it changes far more slowly than a frame, and the profiles
+  // are most of the cost.
+  static constexpr int kSoundingInterval = 2;
+  static bool Sounded(int64_t k);
 
   MultipathScorerParams params_;
   int frame_size_;

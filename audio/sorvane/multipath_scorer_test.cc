@@ -263,11 +263,13 @@ TEST_F(MultipathScorerTest, TrackScoresOnceAndIndependentlyOfView) {
   ASSERT_GT(last_end, size);
   ASSERT_GE(expected.size(), static_cast<size_t>(kFrames - params.channel_frames));
 
-  // A frame waits for its last neighbour's window to the last sample.
+  // A frame waits for the window of its last sounded neighbour (the
+  // channel is sounded on even frames) to the last sample.
   {
     MultipathScorer scorer(coder_, params);
     scorer.StartTrack(kStart, 0.0f);
-    const int64_t end = scorer.FrameStart(5 + params.channel_frames) + kFrame + params.span;
+    const int last_sounded = (5 + params.channel_frames) / 2 * 2;
+    const int64_t end = scorer.FrameStart(last_sounded) + kFrame + params.span;
     EXPECT_FALSE(scorer.Score(baseband.View(0, end - 1), 5, &scores));
     ASSERT_TRUE(scorer.Score(baseband.View(0, end), 5, &scores));
     EXPECT_TRUE(scores.isApprox(expected[5], 1e-5f));
@@ -302,10 +304,11 @@ TEST_F(MultipathScorerTest, TrackScoresOnceAndIndependentlyOfView) {
   ASSERT_TRUE(whole.Score(late, 4, &scores));
   EXPECT_EQ(scores, expected[4]);
 
-  // A new track one frame later: index k is the old k + 1, recomputed.
-  whole.StartTrack(whole.FrameStart(1), 0.0f);
+  // A new track two frames later (the same frames sounded): index k is the
+  // old k + 2, recomputed.
+  whole.StartTrack(whole.FrameStart(2), 0.0f);
   ASSERT_TRUE(whole.Score(baseband.View(), 6, &scores));
-  EXPECT_TRUE(scores.isApprox(expected[7], 1e-5f));
+  EXPECT_TRUE(scores.isApprox(expected[8], 1e-5f));
   EXPECT_FALSE(scores.isApprox(expected[6], 1e-2f));
 
   whole.Reset();

@@ -6,10 +6,13 @@
 // over every new baseband sample. GetToken box-filters the acquisition
 // scores across symbol periods, groups the peaks that sit on one symbol
 // grid (one transmission), scores every symbol frame of the best group
-// against the coder's tones after despreading with Doppler and phase
-// correction, folds the scores by token period and lets the token selector
-// rank candidates. Input beyond the buffer budget is truncated with a
-// warning.
+// against the coder's tones, folds the scores by token period and lets the
+// token selector rank candidates. Symbol frames are scored over the room's
+// multipath by default (MultipathScorer: channel estimated over tens of
+// milliseconds of lags, Doppler searched once per transmission); with
+// multipath_span 0 each detection is scored at its own lag with its own
+// Doppler and phase correction. Input beyond the buffer budget is truncated
+// with a warning.
 //
 // Not thread safe: one caller thread per decoder. Calls before Initialize
 // are logged errors that do nothing.
