@@ -100,7 +100,6 @@ MultipathScorer::MultipathScorer(const SymbolWaveCoder& coder,
   CHECK(params_.max_doppler >= 0.0f);
   CHECK(params_.doppler_step > 0.0f);
   CHECK(params_.doppler_frames >= 1);
-  CHECK(carrier_cycles_per_frame_ > 0.0f);
   CHECK_EQ(static_cast<int>(code_.size()), frame_size_);
   const int n = fft_.GetSize();
   buffer_.assign(n, {});
@@ -119,6 +118,8 @@ bool MultipathScorer::HasWindow(const BasebandView& view, int64_t start) const {
 }
 
 double MultipathScorer::Period(float doppler) const {
+  // A coder without a carrier has no Doppler to scale time with.
+  if (carrier_cycles_per_frame_ <= 0.0f) return frame_size_;
   return frame_size_ / (1.0 + doppler / carrier_cycles_per_frame_);
 }
 
