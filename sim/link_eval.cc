@@ -80,34 +80,55 @@ TrialResult RunTrial(const LinkSetup& setup, double snr_db, uint64_t seed) {
   return result;
 }
 
+namespace {
+
+// Totals over the points of one curve.
+struct CurveTally {
+  double audio = 0.0, decode = 0.0, first_sum = 0.0;
+  int first_count = 0, done = 0, total = 0;
+};
+
+// `seeds` trials of one setup at one SNR, seeds counted from `seed_base`.
+CurvePoint RunPoint(const LinkSetup& setup, CurvePoint point, uint64_t seed_base, int seeds,
+                    const std::function<void(int, int)>& progress, CurveTally* tally) {
+  double point_first = 0.0;
+  for (int s = 0; s < seeds; ++s) {
+    const TrialResult t = RunTrial(setup, point.snr_db, seed_base + s);
+    ++point.trials;
+    tally->audio += t.audio_seconds;
+    tally->decode += t.decode_seconds;
+    if (t.success) {
+      ++point.successes;
+      point_first += t.first_token_seconds;
+    }
+    point.wrong_tokens += t.wrong_token;
+    if (progress) progress(++tally->done, tally->total);
+  }
+  if (point.successes > 0) point.mean_first_token_seconds = point_first / point.successes;
+  tally->first_sum += point_first;
+  tally->first_count += point.successes;
+  return point;
+}
+
+void Finish(const CurveTally& tally, Curve* curve) {
+  if (tally.first_count > 0) curve->mean_first_token_seconds = tally.first_sum / tally.first_count;
+  if (tally.decode > 0.0) curve->real_time_factor = tally.audio / tally.decode;
+}
+
+}  // namespace
+
 Curve EvaluateCurve(const LinkSetup& setup, const std::string& label,
                     const std::vector<double>& snrs_db, int seeds,
                     const std::function<void(int, int)>& progress) {
   Curve curve;
   curve.label = label;
-  double audio = 0.0, decode = 0.0, first_sum = 0.0;
-  int first_count = 0, done = 0;
-  const int total = static_cast<int>(snrs_db.size()) * seeds;
+  CurveTally tally;
+  tally.total = static_cast<int>(snrs_db.size()) * seeds;
   bool leading = true;
   for (double snr : snrs_db) {
-    CurvePoint point{.snr_db = snr};
-    double point_first = 0.0;
-    for (int s = 0; s < seeds; ++s) {
-      const TrialResult t =
-          RunTrial(setup, snr, 1000003ULL * static_cast<uint64_t>(snr + 1000) + s);
-      ++point.trials;
-      audio += t.audio_seconds;
-      decode += t.decode_seconds;
-      if (t.success) {
-        ++point.successes;
-        point_first += t.first_token_seconds;
-      }
-      point.wrong_tokens += t.wrong_token;
-      if (progress) progress(++done, total);
-    }
-    if (point.successes > 0) point.mean_first_token_seconds = point_first / point.successes;
-    first_sum += point_first;
-    first_count += point.successes;
+    const CurvePoint point =
+        RunPoint(setup, {.snr_db = snr}, 1000003ULL * static_cast<uint64_t>(snr + 1000), seeds,
+                 progress, &tally);
     if (leading && point.success_rate() >= 0.95) {
       curve.lowest_snr_db = snr;
     } else {
@@ -115,8 +136,7 @@ Curve EvaluateCurve(const LinkSetup& setup, const std::string& label,
     }
     curve.points.push_back(point);
   }
-  if (first_count > 0) curve.mean_first_token_seconds = first_sum / first_count;
-  if (decode > 0.0) curve.real_time_factor = audio / decode;
+  Finish(tally, &curve);
   return curve;
 }
 
@@ -125,36 +145,18 @@ Curve EvaluateDistances(const LinkSetup& setup, const std::string& label,
                         const std::function<void(int, int)>& progress) {
   Curve curve;
   curve.label = label;
-  double audio = 0.0, decode = 0.0, first_sum = 0.0;
-  int first_count = 0, done = 0;
-  const int total = static_cast<int>(distances_m.size()) * seeds;
+  CurveTally tally;
+  tally.total = static_cast<int>(distances_m.size()) * seeds;
   for (double distance : distances_m) {
     LinkSetup at = setup;
     at.channel.room.distance = distance;
-    CurvePoint point{.snr_db = snr_db, .distance_m = distance};
-    double point_first = 0.0;
-    for (int s = 0; s < seeds; ++s) {
-      // The same trials (placements, messages, noise) for a distance
-      // whatever else is asked, and for every scheme.
-      const TrialResult t =
-          RunTrial(at, snr_db, 1000003ULL * static_cast<uint64_t>(distance * 1000) + s);
-      ++point.trials;
-      audio += t.audio_seconds;
-      decode += t.decode_seconds;
-      if (t.success) {
-        ++point.successes;
-        point_first += t.first_token_seconds;
-      }
-      point.wrong_tokens += t.wrong_token;
-      if (progress) progress(++done, total);
-    }
-    if (point.successes > 0) point.mean_first_token_seconds = point_first / point.successes;
-    first_sum += point_first;
-    first_count += point.successes;
-    curve.points.push_back(point);
+    // The same trials (placements, messages, noise) for a distance
+    // whatever else is asked, and for every scheme.
+    curve.points.push_back(RunPoint(at, {.snr_db = snr_db, .distance_m = distance},
+                                    1000003ULL * static_cast<uint64_t>(distance * 1000), seeds,
+                                    progress, &tally));
   }
-  if (first_count > 0) curve.mean_first_token_seconds = first_sum / first_count;
-  if (decode > 0.0) curve.real_time_factor = audio / decode;
+  Finish(tally, &curve);
   return curve;
 }
 
