@@ -64,16 +64,16 @@ bool ParseNumber(const std::string& text, double* value) {
   return !text.empty() && end == text.c_str() + text.size() && std::isfinite(*value);
 }
 
-std::string ParseRooms(const std::string& text, std::vector<RoomSpec>* rooms) {
+std::string ParseRooms(const std::string& text, std::vector<RoomShape>* rooms) {
   std::stringstream in(text);
   for (std::string item; std::getline(in, item, ',');) {
-    RoomSpec spec;
-    spec.text = item;
+    RoomShape shape;
+    shape.text = item;
     const std::string bad = "--room takes WxDxH[:RT60] in m and s, e.g. 4x3x2.5:0.4, not '" +
                             item + "'";
     const size_t colon = item.find(':');
     if (colon != std::string::npos &&
-        (!ParseNumber(item.substr(colon + 1), &spec.rt60) || !(spec.rt60 > 0))) {
+        (!ParseNumber(item.substr(colon + 1), &shape.rt60) || !(shape.rt60 > 0))) {
       return bad;
     }
     const std::string size_text = item.substr(0, colon);
@@ -86,8 +86,8 @@ std::string ParseRooms(const std::string& text, std::vector<RoomSpec>* rooms) {
       sizes.push_back(v);
     }
     if (sizes.size() != 3) return bad;
-    spec.width = sizes[0], spec.depth = sizes[1], spec.height = sizes[2];
-    rooms->push_back(spec);
+    shape.width = sizes[0], shape.depth = sizes[1], shape.height = sizes[2];
+    rooms->push_back(shape);
   }
   if (rooms->empty()) return "--room is empty";
   return "";
@@ -95,16 +95,16 @@ std::string ParseRooms(const std::string& text, std::vector<RoomSpec>* rooms) {
 
 }  // namespace
 
-std::string MakeRoom(const RoomSpec& spec, double rt60, const sorvel_sim::RoomConfig& base,
+std::string MakeRoom(const RoomShape& shape, double rt60, const sorvel_sim::RoomConfig& base,
                      sorvel_sim::RoomConfig* room) {
   *room = base;
-  room->width = spec.width, room->depth = spec.depth, room->height = spec.height;
-  room->rt60 = std::isnan(spec.rt60) ? rt60 : spec.rt60;
+  room->width = shape.width, room->depth = shape.depth, room->height = shape.height;
+  room->rt60 = std::isnan(shape.rt60) ? rt60 : shape.rt60;
   if (!(room->rt60 > 0)) {
-    return "room " + spec.text + " needs an RT60: WxDxH:RT60 or --rt60";
+    return "room " + shape.text + " needs an RT60: WxDxH:RT60 or --rt60";
   }
   if (std::string e = sorvel_sim::CheckRoom(*room); !e.empty()) {
-    return "room " + spec.text + ": " + e;
+    return "room " + shape.text + ": " + e;
   }
   return "";
 }

@@ -13,7 +13,7 @@ namespace sorvel_cli {
 
 // One room of --room: its size in metres and, after a colon, its RT60 in
 // seconds (NAN when not given).
-struct RoomSpec {
+struct RoomShape {
   double width = 0, depth = 0, height = 0;
   double rt60 = NAN;
   std::string text;  // as given
@@ -27,7 +27,7 @@ struct ChannelOptions {
   std::string source = "omni";
   bool no_phone_speaker = false;
   bool no_phone_mic = false;
-  std::vector<RoomSpec> rooms;  // parsed from `room`
+  std::vector<RoomShape> rooms;  // parsed from `room`
 };
 
 // --noise, --rate, --band-limit, --clip, --gain, --mix, --mix-gain, the
@@ -41,9 +41,9 @@ void AddChannelOptions(CLI::App* command, ChannelOptions* options, bool single_v
 // `rate`. Returns an empty string or the problem.
 std::string ResolveChannelOptions(ChannelOptions& options);
 
-// `base` (switches and distance) with the size of `spec` and its RT60, or
+// `base` (switches and distance) with the size of `shape` and its RT60, or
 // `rt60` when it has none, checked: returns "" or the problem.
-std::string MakeRoom(const RoomSpec& spec, double rt60, const sorvel_sim::RoomConfig& base,
+std::string MakeRoom(const RoomShape& shape, double rt60, const sorvel_sim::RoomConfig& base,
                      sorvel_sim::RoomConfig* room);
 
 }  // namespace sorvel_cli

@@ -125,17 +125,17 @@ int RunDistanceEval(const EvalOptions& o, const std::vector<std::string>& scheme
   const double snr = std::isnan(o.snr) ? 10.0 : o.snr;
   std::vector<sorvel_sim::RoomConfig> rooms;
   std::vector<std::string> names;
-  for (const RoomSpec& spec : o.channel.rooms) {
-    for (double rt60 : std::isnan(spec.rt60) ? rt60s : std::vector<double>{spec.rt60}) {
+  for (const RoomShape& shape : o.channel.rooms) {
+    for (double rt60 : std::isnan(shape.rt60) ? rt60s : std::vector<double>{shape.rt60}) {
       sorvel_sim::RoomConfig room;
       for (double distance : distances) {
         sorvel_sim::RoomConfig base = o.channel.config.room;
         base.distance = distance;
-        if (std::string e = MakeRoom(spec, rt60, base, &room); !e.empty()) return fail(e);
+        if (std::string e = MakeRoom(shape, rt60, base, &room); !e.empty()) return fail(e);
       }
       rooms.push_back(room);
       std::ostringstream name;
-      name << spec.width << "x" << spec.depth << "x" << spec.height << " m RT60 " << room.rt60
+      name << shape.width << "x" << shape.depth << "x" << shape.height << " m RT60 " << room.rt60
            << " s";
       names.push_back(name.str());
     }
@@ -250,15 +250,15 @@ int RunEval(EvalOptions& o) {
   // A physical room (at --distance) takes the place of the RT60 list.
   std::vector<sorvel_sim::RoomConfig> rooms;
   std::vector<std::string> room_labels;
-  for (const RoomSpec& spec : o.channel.rooms) {
-    for (double rt60 : std::isnan(spec.rt60) ? rt60s : std::vector<double>{spec.rt60}) {
+  for (const RoomShape& shape : o.channel.rooms) {
+    for (double rt60 : std::isnan(shape.rt60) ? rt60s : std::vector<double>{shape.rt60}) {
       sorvel_sim::RoomConfig room;
-      if (std::string e = MakeRoom(spec, rt60, o.channel.config.room, &room); !e.empty()) {
+      if (std::string e = MakeRoom(shape, rt60, o.channel.config.room, &room); !e.empty()) {
         return fail(e);
       }
       rooms.push_back(room);
       std::ostringstream label;
-      label << " " << spec.width << "x" << spec.depth << "x" << spec.height << " " << room.rt60
+      label << " " << shape.width << "x" << shape.depth << "x" << shape.height << " " << room.rt60
             << " s " << room.distance << " m";
       room_labels.push_back(label.str());
     }
