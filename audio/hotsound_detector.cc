@@ -132,15 +132,6 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
   pooled_.resize(kN);
 }
 
-void HotsoundDetector::Reset() {
-  fill_ = 0;
-  skip_ = 0;
-  std::fill(scales_.begin(), scales_.end(), 0.0f);
-  ring_next_ = 0;
-  score_ = 0.0f;
-  windows_scored_ = 0;
-}
-
 float HotsoundDetector::Process(std::span<int16_t> samples) {
   size_t n = samples.size();
   if (step_ >= 2) {

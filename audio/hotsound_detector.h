@@ -70,12 +70,10 @@ class HotsoundDetector {
   // the block completed none.
   float Process(std::span<int16_t> samples);
   bool Detected(float score) const { return score > kThreshold; }
-  // Forgets all audio: the next windows start from a zero score.
-  void Reset();
 
   int step() const { return step_; }
   float score() const { return score_; }
-  // Windows scored since construction or the last Reset.
+  // Windows scored since construction.
   int64_t windows_scored() const { return windows_scored_; }
   // Input samples (after decimation) from one window start to the next.
   int hop_samples() const { return hop_samples_; }

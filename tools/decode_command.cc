@@ -132,6 +132,9 @@ std::string StreamDecoder::Start(const ModemOptions& modem, const ReceiverOption
   }
   if (rate <= 0 || channels < 1) return "the input needs a positive rate and channel count";
   if (receiver.hotsound && !modem.is_dsss()) return "--hotsound works with the dsss scheme";
+  if (receiver.hotsound) {
+    if (std::string e = CheckHotsoundRate(rate); !e.empty()) return e;
+  }
   // The DSSS carrier needs a receiver rate above twice its frequency.
   if (modem.is_dsss() && rate < 2 * modem.dsss.coder.desired_carrier_frequency) {
     return "a " + std::to_string(static_cast<int>(rate)) + " Hz input cannot carry the " +
