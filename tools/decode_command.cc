@@ -3,6 +3,7 @@
 #include <sndfile.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstdint>
 #include <cstdio>
 #include <iostream>
@@ -155,6 +156,12 @@ std::string StreamDecoder::Start(const ModemOptions& modem, const ReceiverOption
     if (receiver.buffer_duration_factor) {
       config.buffer_duration_factor = *receiver.buffer_duration_factor;
     }
+    // Input is read as fast as it decodes: the hotsound timeout runs on
+    // the audio's time.
+    config.hotsound_clock = [this] {
+      return std::chrono::steady_clock::time_point() +
+             std::chrono::microseconds(frames_ * 1000000 / static_cast<int64_t>(rate_));
+    };
     decoder_ = audio_sorvane::MakeDsssDecoder(config);
   } else {
     audio_sorvane::DtmfDecoderConfig config;
