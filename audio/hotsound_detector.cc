@@ -18,10 +18,10 @@ constexpr int kN = HotsoundDetector::kBasebandSize;
 constexpr double kTapsPerSample = 4.0;
 constexpr double kCutoffHz = 2200.0;
 // Track sum (in units of a window's mean power) that scores kThreshold.
-// Noise of any kind and level reaches about 26 in an hour (the tail falls
-// about e-fold per unit); a broadcast at -16 dB full-band SNR in white noise
-// about 60 at rest and 40 at 1 m/s.
-constexpr float kRawThreshold = 31.0f;
+// In an hour noise of any kind and level reaches about 26, speech and music
+// 30 (the tails fall about e-fold per unit); a broadcast at -16 dB full-band
+// SNR in white noise about 55 at rest and 40 at 1 m/s.
+constexpr float kRawThreshold = 33.0f;
 // Windows whose baseband power per sample is below this (digital silence)
 // score zero.
 constexpr float kSilentPower = 1e-3f;
