@@ -17,14 +17,19 @@ constexpr int kN = HotsoundDetector::kBasebandSize;
 // music) some 50 dB down.
 constexpr double kTapsPerSample = 4.0;
 constexpr double kCutoffHz = 2200.0;
-// Track sum (in units of a window's mean power) that scores kThreshold.
-// In an hour noise of any kind and level reaches about 26, speech and music
-// 30 (the tails fall about e-fold per unit); a broadcast at -16 dB full-band
-// SNR in white noise about 55 at rest and 40 at 1 m/s.
+// Track sums (in units of a window's mean power) that score kThreshold. In
+// an hour noise of any kind and level reaches about 26 on the short track
+// and 38 on the long one, speech and music 30 and 39 (the tails fall about
+// e-fold per unit). A broadcast at -16 dB full-band SNR in white noise sums
+// about 55 on the short track at rest, 40 at 1 m/s.
 constexpr float kRawThreshold = 33.0f;
+constexpr float kLongRawThreshold = 44.0f;
 // Windows whose baseband power per sample is below this (digital silence)
 // score zero.
 constexpr float kSilentPower = 1e-3f;
+// Peak over mean baseband power above which a window counts as a click.
+// Noise and broadcasts stay below about 12 (ln 256 plus a few).
+constexpr float kMaxCrest = 20.0f;
 // The code's lag moves against the carrier offset (a faster broadcast
 // reaches each window earlier in its code).
 constexpr double kDriftSign = -1.0;
@@ -126,9 +131,10 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
     drift_.push_back(static_cast<int>(std::lround(kDriftSign * compression * kHopFrames * kN)));
     CHECK(std::abs(drift_.back()) + 1 <= kPad);
   }
-  ring_.assign(kWindows, std::vector<float>(kDopplerBins * kN, 0.0f));
-  scales_.assign(kWindows, 0.0f);
-  track_.assign(kDopplerBins * kRow, 0.0f);
+  ring_.assign(kLongWindows, std::vector<float>(kDopplerBins * kN, 0.0f));
+  scales_.assign(kLongWindows, 0.0f);
+  short_tracks_.assign(kLongWindows, std::vector<float>(kDopplerBins * kRow, 0.0f));
+  long_track_.assign(kDopplerBins * kRow, 0.0f);
   pooled_.resize(kN);
 }
 
@@ -171,6 +177,7 @@ void HotsoundDetector::ScoreWindow() {
   ++windows_scored_;
   // Mix down and low-pass to kN complex samples.
   double energy = 0.0;
+  float peak = 0.0f;
   for (int m = 0; m < kN; ++m) {
     const float* x = window_.data() + tap_start_[m];
     const float* re = taps_re_.data() + static_cast<size_t>(m) * taps_;
@@ -185,13 +192,18 @@ void HotsoundDetector::ScoreWindow() {
     }
     const float sr = Sum(r0 + r1), si = Sum(i0 + i1);
     baseband_[m] = {sr, si};
-    energy += static_cast<double>(sr) * sr + static_cast<double>(si) * si;
+    const float power = sr * sr + si * si;
+    energy += power;
+    peak = std::max(peak, power);
   }
 
   std::vector<float>& powers = ring_[ring_next_];
-  ring_next_ = (ring_next_ + 1) % kWindows;
-  float scale = 0.0f;  // digital silence scores zero
-  if (energy >= kSilentPower * kN) {
+  ring_next_ = (ring_next_ + 1) % kLongWindows;
+  // Digital silence scores zero, and so does a window that one click
+  // dominates: its correlation is the code itself, the same in every window
+  // that a regular tick lands in alike.
+  float scale = 0.0f;
+  if (energy >= kSilentPower * kN && peak < kMaxCrest * energy / kN) {
     fft_.Forward(baseband_.data(), spectrum_.data());
     // Correlation powers per offset; their total from the products (the
     // inverse transform is unnormalised: sum |c|^2 = kN sum |product|^2).
@@ -209,36 +221,50 @@ void HotsoundDetector::ScoreWindow() {
     }
     scale = static_cast<float>(kDopplerBins / total);
   }
-  scales_[(ring_next_ + kWindows - 1) % kWindows] = scale;
+  scales_[(ring_next_ + kLongWindows - 1) % kLongWindows] = scale;
 
-  // Best lag track through the last kWindows windows, oldest first. Rows
-  // carry kPad copies of the other end on both sides for the cyclic lags.
+  // The short track over the last kWindows windows; the long one extends
+  // the short track that ended kWindows windows ago by the same windows.
+  const int newest = (ring_next_ + kLongWindows - 1) % kLongWindows;
+  const int first = (newest + kLongWindows - kWindows + 1) % kLongWindows;
+  float* short_track = short_tracks_[newest].data();
+  float* long_track = long_track_.data();
   for (int d = 0; d < kDopplerBins; ++d) {
-    const float* e = ring_[ring_next_].data() + d * kN;
-    const float scale0 = scales_[ring_next_];
-    std::transform(e, e + kN, track_.begin() + d * kRow + kPad, [=](float p) { return p * scale0; });
+    const float* e = ring_[first].data() + d * kN;
+    const float scale = scales_[first];
+    std::transform(e, e + kN, short_track + d * kRow + kPad, [=](float p) { return p * scale; });
+    const float* older = short_tracks_[(first + kLongWindows - 1) % kLongWindows].data() + d * kRow;
+    std::copy(older, older + kRow, long_track + d * kRow);
+    ExtendTrack(long_track + d * kRow, e, scale, drift_[d]);
   }
   for (int k = 1; k < kWindows; ++k) {
-    const std::vector<float>& next = ring_[(ring_next_ + k) % kWindows];
-    const float next_scale = scales_[(ring_next_ + k) % kWindows];
+    const int slot = (first + k) % kLongWindows;
     for (int d = 0; d < kDopplerBins; ++d) {
-      float* a = track_.data() + d * kRow;
-      std::copy(a + kN, a + kN + kPad, a);
-      std::copy(a + kPad, a + 2 * kPad, a + kN + kPad);
-      const float* from = a + kPad - drift_[d];
-      const float* e = next.data() + d * kN;
-      for (int t = 0; t < kN; ++t) {
-        pooled_[t] = next_scale * e[t] + std::max(std::max(from[t - 1], from[t]), from[t + 1]);
-      }
-      std::copy(pooled_.begin(), pooled_.end(), a + kPad);
+      const float* e = ring_[slot].data() + d * kN;
+      ExtendTrack(short_track + d * kRow, e, scales_[slot], drift_[d]);
+      ExtendTrack(long_track + d * kRow, e, scales_[slot], drift_[d]);
     }
   }
-  float raw = 0.0f;
+  float raw_short = 0.0f, raw_long = 0.0f;
   for (int d = 0; d < kDopplerBins; ++d) {
-    const float* a = track_.data() + d * kRow + kPad;
-    raw = std::max(raw, *std::max_element(a, a + kN));
+    const float* a = short_track + d * kRow + kPad;
+    const float* b = long_track + d * kRow + kPad;
+    raw_short = std::max(raw_short, *std::max_element(a, a + kN));
+    raw_long = std::max(raw_long, *std::max_element(b, b + kN));
   }
-  score_ = raw * (kThreshold / kRawThreshold);
+  score_ = kThreshold * std::max(raw_short / kRawThreshold, raw_long / kLongRawThreshold);
+}
+
+void HotsoundDetector::ExtendTrack(float* row, const float* powers, float scale, int drift) {
+  // Rows carry kPad copies of the other end on both sides for the cyclic
+  // lags; each step may move one lag around the drift.
+  std::copy(row + kN, row + kN + kPad, row);
+  std::copy(row + kPad, row + 2 * kPad, row + kN + kPad);
+  const float* from = row + kPad - drift;
+  for (int t = 0; t < kN; ++t) {
+    pooled_[t] = scale * powers[t] + std::max(std::max(from[t - 1], from[t]), from[t + 1]);
+  }
+  std::copy(pooled_.begin(), pooled_.end(), row + kPad);
 }
 
 std::unique_ptr<HotsoundDetector> MakeHotsoundDetector(int sample_rate, int step) {

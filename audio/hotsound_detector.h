@@ -11,13 +11,16 @@
 // kDopplerBins inverse FFTs. Each window's correlation powers are divided by
 // their mean, so the statistic does not depend on the level or the spectral
 // tilt of the audio: noise, speech, music, tones and clicks spread evenly
-// over the lags, the code piles up at one. The score adds the last
-// kWindows windows along a lag track (each step may move one lag, which
-// follows the drift of a moving phone) and takes the best track and offset;
-// 25.0 means a broadcast.
+// over the lags, the code piles up at one. A score adds windows along a lag
+// track (each step may move one lag around the drift that the carrier
+// offset implies, which follows a moving phone) and takes the best track
+// and offset, twice: over the last kWindows windows (about 0.5 s, for a
+// quick wake) and over the last kLongWindows (about 1 s, for weak or
+// reverberant broadcasts), each against its own threshold; 25.0 means a
+// broadcast.
 //
-// Scores depend only on the audio of the last kWindows windows (about
-// 0.5 s), not on how it was split into blocks. Not thread safe.
+// Scores depend only on the audio of the last kLongWindows windows, not on
+// how it was split into blocks. Not thread safe.
 #ifndef AUDIO_HOTSOUND_DETECTOR_H_
 #define AUDIO_HOTSOUND_DETECTOR_H_
 
@@ -56,6 +59,7 @@ class HotsoundDetector {
   static constexpr int kDopplerBins = 5;
   static constexpr int kHopFrames = 3;  // frames from one window to the next
   static constexpr int kWindows = 4;    // windows a score adds up
+  static constexpr int kLongWindows = 8;  // ... and the slower, finer one
 
   // Null when the configuration cannot make a detector: a bad rate or hop,
   // or a carrier band that does not fit below half the sample rate.
@@ -81,6 +85,7 @@ class HotsoundDetector {
  private:
   HotsoundDetector(const HotsoundDetectorConfig& config, int step);
   void ScoreWindow();
+  void ExtendTrack(float* row, const float* powers, float scale, int drift);
 
   HotsoundDetectorConfig config_;
   int step_;
@@ -106,7 +111,9 @@ class HotsoundDetector {
   std::vector<float> scales_;  // per window: 1 / mean power, 0 if silent
   int ring_next_ = 0;
   std::vector<int> drift_;  // per carrier offset: lags the code moves per window
-  std::vector<float> track_, pooled_;
+  // Per window slot, the short track that ended there; the long track.
+  std::vector<std::vector<float>> short_tracks_;
+  std::vector<float> long_track_, pooled_;
   float score_ = 0.0f;
   int64_t windows_scored_ = 0;
 };
