@@ -12,10 +12,10 @@ namespace audio_sorvane {
 namespace {
 
 constexpr int kN = HotsoundDetector::kBasebandSize;
-// Low-pass taps per baseband sample: four sample spacings of a Blackman
-// windowed sinc keep what lies more than ~6 kHz from the carrier (speech,
+// Low-pass taps per baseband sample: three sample spacings of a Blackman
+// windowed sinc keep what lies more than ~8 kHz from the carrier (speech,
 // music) some 50 dB down.
-constexpr double kTapsPerSample = 4.0;
+constexpr double kTapsPerSample = 3.0;
 constexpr double kCutoffHz = 2200.0;
 // Track sums (in units of a window's mean power) that score kThreshold. In
 // an hour noise of any kind and level reaches about 26 on the short track
