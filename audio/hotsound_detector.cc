@@ -12,18 +12,19 @@ namespace audio_sorvane {
 namespace {
 
 constexpr int kN = HotsoundDetector::kBasebandSize;
-// Low-pass taps per baseband sample: three sample spacings of a Blackman
-// windowed sinc keep what lies more than ~8 kHz from the carrier (speech,
-// music) some 50 dB down.
-constexpr double kTapsPerSample = 3.0;
+// Low-pass taps per baseband sample: four sample spacings of a Blackman
+// windowed sinc keep what lies more than ~6 kHz from the carrier (speech,
+// music) some 50 dB down. Three let tonal music through a phone
+// microphone's roll-off leak in and wake the detector.
+constexpr double kTapsPerSample = 4.0;
 constexpr double kCutoffHz = 2200.0;
 // Track sums (in units of a window's mean power) that score kThreshold. In
 // an hour noise of any kind and level reaches about 26 on the short track
-// and 38 on the long one, speech and music 30 and 39 (the tails fall about
+// and 40 on the long one, speech and music 30 and 41 (the tails fall about
 // e-fold per unit). A broadcast at -16 dB full-band SNR in white noise sums
 // about 55 on the short track at rest, 40 at 1 m/s.
-constexpr float kRawThreshold = 33.0f;
-constexpr float kLongRawThreshold = 44.0f;
+constexpr float kRawThreshold = 34.0f;
+constexpr float kLongRawThreshold = 46.0f;
 // Windows whose baseband power per sample is below this (digital silence)
 // score zero.
 constexpr float kSilentPower = 1e-3f;
