@@ -10,7 +10,7 @@ namespace audio_sorvane {
 HotsoundDecoder::HotsoundDecoder(std::unique_ptr<SorvaneDecoder> dsss_decoder,
                                  std::unique_ptr<HotsoundDetector> hotsound_detector,
                                  Clock clock)
-    : pre_trigger_(kPreTriggerCapacity),
+    : pre_trigger_(2 * kPreTriggerCapacity),
       last_activity_(std::chrono::steady_clock::time_point::min()),
       clock_(std::move(clock)) {
   CHECK(dsss_decoder);
@@ -39,15 +39,19 @@ void HotsoundDecoder::ProcessSamples(const int16_t* samples, int count) {
     return;
   }
   // Keep the newest audio: the block's first `take` samples behind as much
-  // of the old audio as still fits.
+  // of the old audio as still fits. The buffer has room for two captures, so
+  // the kept audio moves to the front only when the end is reached.
   const int take = std::min(kPreTriggerCapacity, count);
-  const int room = kPreTriggerCapacity - take;
-  const int keep = std::min(room, pre_trigger_count_);
-  if (keep >= 1 && room < pre_trigger_count_) {
-    std::copy(pre_trigger_.begin() + (pre_trigger_count_ - keep),
-              pre_trigger_.begin() + pre_trigger_count_, pre_trigger_.begin());
+  const int keep = std::min(kPreTriggerCapacity - take, pre_trigger_count_);
+  const int old_end = pre_trigger_start_ + pre_trigger_count_;
+  if (old_end + take > static_cast<int>(pre_trigger_.size())) {
+    std::copy(pre_trigger_.begin() + (old_end - keep), pre_trigger_.begin() + old_end,
+              pre_trigger_.begin());
+    pre_trigger_start_ = 0;
+  } else {
+    pre_trigger_start_ = old_end - keep;
   }
-  std::copy(samples, samples + take, pre_trigger_.begin() + keep);
+  std::copy(samples, samples + take, pre_trigger_.begin() + pre_trigger_start_ + keep);
   pre_trigger_count_ = keep + take;
 
   const float score = hotsound_detector_->Process(block_);
@@ -55,8 +59,9 @@ void HotsoundDecoder::ProcessSamples(const int16_t* samples, int count) {
   VLOG(1) << "Hotsound detected, score " << score;
   state_ = 1;
   last_activity_ = clock_();
-  FeedDsss(pre_trigger_.data(), pre_trigger_count_);
+  FeedDsss(pre_trigger_samples(), pre_trigger_count_);
   pre_trigger_count_ = 0;
+  pre_trigger_start_ = 0;
 }
 
 void HotsoundDecoder::UpdateActivity(bool success) {

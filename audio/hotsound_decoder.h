@@ -48,7 +48,7 @@ class HotsoundDecoder {
 
   bool triggered() const { return state_ == 1; }
   int pre_trigger_count() const { return pre_trigger_count_; }
-  const int16_t* pre_trigger_samples() const { return pre_trigger_.data(); }
+  const int16_t* pre_trigger_samples() const { return pre_trigger_.data() + pre_trigger_start_; }
   const SorvaneDecoder& dsss_decoder() const { return *dsss_decoder_; }
 
  private:
@@ -57,6 +57,7 @@ class HotsoundDecoder {
 
   std::unique_ptr<SorvaneDecoder> dsss_decoder_;
   std::unique_ptr<HotsoundDetector> hotsound_detector_;
+  int pre_trigger_start_ = 0;  // the oldest kept sample
   int pre_trigger_count_ = 0;
   std::vector<int16_t> pre_trigger_;
   int state_ = 0;
