@@ -95,13 +95,15 @@ std::vector<float> RenderSpeech(double peak) {
   return speech;
 }
 
-std::vector<float> RenderMusic(double peak) {
+std::vector<float> RenderMusic(double peak, int seconds) {
   const char* module = "/usr/share/games/frozen-bubble/snd/frozen-mainzik-2p.xm";
-  const std::string path = TempPath() ;
+  const std::string path = TempPath();
   if (path.empty()) return {};
   const std::string wav = path + ".wav";
   const std::string command =
-      std::string("xmp -q -f 44100 -o ") + wav + " " + module + " >/dev/null 2>&1";
+      std::string("xmp -q -f 44100 ") +
+      (seconds > 0 ? "-t " + std::to_string(seconds) + " " : std::string()) + "-o " + wav + " " +
+      module + " >/dev/null 2>&1";
   std::vector<float> music;
   if (std::system(command.c_str()) == 0) music = ReadWav16(wav);
   std::remove(wav.c_str());

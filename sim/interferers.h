@@ -15,9 +15,9 @@ namespace sorvel_sim {
 // espeak-ng's 22.05 kHz, peaks near `peak`. Empty if espeak-ng is missing.
 std::vector<float> RenderSpeech(double peak);
 
-// The module's 207 s as mono, scaled to peaks near `peak`. Empty if xmp or
-// the module is missing.
-std::vector<float> RenderMusic(double peak);
+// The module's 207 s (or its first `seconds`, if positive) as mono, scaled
+// to peaks near `peak`. Empty if xmp or the module is missing.
+std::vector<float> RenderMusic(double peak, int seconds = 0);
 
 // `num_samples` of transients over faint noise (RMS 3): single-sample
 // spikes, decaying knocks and taps at random times and levels up to
