@@ -175,7 +175,6 @@ float HotsoundDetector::Process(std::span<int16_t> samples) {
 }
 
 void HotsoundDetector::ScoreWindow() {
-  ++windows_scored_;
   // Mix down and low-pass to kN complex samples.
   double energy = 0.0;
   float peak = 0.0f;

@@ -77,10 +77,6 @@ class HotsoundDetector {
 
   int step() const { return step_; }
   float score() const { return score_; }
-  // Windows scored since construction.
-  int64_t windows_scored() const { return windows_scored_; }
-  // Input samples (after decimation) from one window start to the next.
-  int hop_samples() const { return hop_samples_; }
 
  private:
   HotsoundDetector(const HotsoundDetectorConfig& config, int step);
@@ -115,7 +111,6 @@ class HotsoundDetector {
   std::vector<std::vector<float>> short_tracks_;
   std::vector<float> long_track_, pooled_;
   float score_ = 0.0f;
-  int64_t windows_scored_ = 0;
 };
 
 // The configuration from the integer input rate and the step (channels).
