@@ -161,8 +161,9 @@ std::unique_ptr<AudioModemDecoder> MakeDsssDecoder(const DsssDecoderConfig& conf
   std::unique_ptr<AudioModemDecoder> decoder;
   if (config.with_hotsound) {
     decoder = std::make_unique<AudioModemDecoder>(std::make_unique<HotsoundDecoder>(
-        std::move(dsss), MakeHotsoundDetector(static_cast<int>(config.input_sample_rate),
-                                              config.num_channels)));
+        std::move(dsss),
+        MakeHotsoundDetector(static_cast<int>(config.input_sample_rate), config.num_channels),
+        config.hotsound_clock ? config.hotsound_clock : std::chrono::steady_clock::now));
   } else {
     decoder = std::make_unique<AudioModemDecoder>(std::move(dsss));
   }

@@ -89,6 +89,10 @@ struct DsssDecoderConfig {
   float detection_threshold = 4.0f;
   float input_sample_rate = 44100.0f;
   float buffer_duration_factor = 4.0f;  // about 3 s with the defaults
+  // The hotsound decoder's activity clock; empty: the steady clock. A file
+  // decoded faster than real time needs its audio time here, or the
+  // decoder's one-second timeout spans minutes of audio.
+  HotsoundDecoder::Clock hotsound_clock;
 };
 
 struct DtmfDecoderConfig {

@@ -4,10 +4,12 @@
 // decoder holds after 60 s of streaming.
 #include <malloc.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <memory>
 #include <vector>
 
+#include "audio/hotsound_detector.h"
 #include "audio/modem_config.h"
 #include "audio/sorvane/sorvane_decoder.h"
 #include "benchmark/benchmark.h"
@@ -54,6 +56,28 @@ void BM_DsssDecoderRealTime(benchmark::State& state) {
       static_cast<double>(signal.size()) / 44100.0, benchmark::Counter::kIsIterationInvariantRate);
 }
 BENCHMARK(BM_DsssDecoderRealTime)->Unit(benchmark::kMillisecond);
+
+// The hotsound wake-up detector alone on the same audio and blocks (items:
+// input samples). Its budget is 3 % of BM_DsssDecoderRealTime's time per
+// audio second, i.e. a real-time factor above ~33 times the decoder's.
+void BM_HotsoundDetectorRealTime(benchmark::State& state) {
+  const std::vector<float> signal = ReceivedBroadcast(10.0, -10.0);
+  std::vector<int16_t> pcm(signal.size()), block;
+  for (size_t i = 0; i < signal.size(); ++i) {
+    pcm[i] = static_cast<int16_t>(std::clamp(signal[i], -32768.0f, 32767.0f));
+  }
+  auto detector = audio_sorvane::MakeHotsoundDetector(44100, 1);
+  for (auto _ : state) {
+    for (size_t start = 0; start + 441 <= pcm.size(); start += 441) {
+      block.assign(pcm.begin() + start, pcm.begin() + start + 441);
+      benchmark::DoNotOptimize(detector->Process(block));
+    }
+  }
+  state.SetItemsProcessed(state.iterations() * static_cast<int64_t>(signal.size()));
+  state.counters["x_real_time"] = benchmark::Counter(
+      static_cast<double>(signal.size()) / 44100.0, benchmark::Counter::kIsIterationInvariantRate);
+}
+BENCHMARK(BM_HotsoundDetectorRealTime)->Unit(benchmark::kMicrosecond);
 
 // Heap held by one decoder (construction included) after 60 s of input.
 void BM_DsssDecoderMemory(benchmark::State& state) {

@@ -87,6 +87,18 @@ expect_simulate_refusal "takes WxDxH" --room 4x3x2.5:fast
 expect_simulate_refusal "needs an RT60" --room 4x3x2.5
 expect_simulate_refusal "does not fit" --room 4x3x2.5:0.4 --distance 6
 expect_simulate_refusal "requires --room" --distance 2
+# The wake-up detector needs room for the carrier's band: 32 and 16 kHz
+# inputs are refused up front, for simulate, eval and decode alike.
+expect_simulate_refusal "--hotsound needs a sample rate" --hotsound --rate 32000
+expect_simulate_refusal "--hotsound needs a sample rate" --hotsound --rate 16000
+"$sorvel" eval --scheme hotsound --rate 32000 --seeds 1 >/dev/null 2>&1
+[ $? -eq 2 ] || { echo "FAIL: eval hotsound at 32 kHz"; failures=$((failures + 1)); }
+"$sorvel" simulate --token 536f7276656c --crc --seconds 1 --rate 32000 -o "$dir/r32.wav" >/dev/null
+err=$("$sorvel" decode --hotsound --crc "$dir/r32.wav" 2>&1 >/dev/null)
+[ $? -eq 2 ] && [[ "$err" == *"--hotsound needs a sample rate of at least"* ]] ||
+  { echo "FAIL: decode --hotsound at 32 kHz -> '$err'"; failures=$((failures + 1)); }
+"$sorvel" simulate --token 536f7276656c --crc --hotsound --snr -6 --rate 48000 | grep -q 536f7276656c ||
+  { echo "FAIL: simulate --hotsound at 48 kHz"; failures=$((failures + 1)); }
 "$sorvel" simulate --token 536f7276656c --crc --seconds 2 --snr 10 --room 4x3x2.5:0.4 \
   --distance 1.5 --source phone | grep -q 536f7276656c ||
   { echo "FAIL: simulate --room"; failures=$((failures + 1)); }

@@ -3,6 +3,7 @@
 #include <sndfile.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstdint>
 #include <cstdio>
 #include <iostream>
@@ -132,6 +133,9 @@ std::string StreamDecoder::Start(const ModemOptions& modem, const ReceiverOption
   }
   if (rate <= 0 || channels < 1) return "the input needs a positive rate and channel count";
   if (receiver.hotsound && !modem.is_dsss()) return "--hotsound works with the dsss scheme";
+  if (receiver.hotsound) {
+    if (std::string e = CheckHotsoundRate(rate); !e.empty()) return e;
+  }
   // The DSSS carrier needs a receiver rate above twice its frequency.
   if (modem.is_dsss() && rate < 2 * modem.dsss.coder.desired_carrier_frequency) {
     return "a " + std::to_string(static_cast<int>(rate)) + " Hz input cannot carry the " +
@@ -152,6 +156,12 @@ std::string StreamDecoder::Start(const ModemOptions& modem, const ReceiverOption
     if (receiver.buffer_duration_factor) {
       config.buffer_duration_factor = *receiver.buffer_duration_factor;
     }
+    // Input is read as fast as it decodes: the hotsound timeout runs on
+    // the audio's time.
+    config.hotsound_clock = [this] {
+      return std::chrono::steady_clock::time_point() +
+             std::chrono::microseconds(frames_ * 1000000 / static_cast<int64_t>(rate_));
+    };
     decoder_ = audio_sorvane::MakeDsssDecoder(config);
   } else {
     audio_sorvane::DtmfDecoderConfig config;

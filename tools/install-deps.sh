@@ -10,7 +10,7 @@ packages=(
   openjdk-17-jdk-headless junit4
   libsndfile1-dev libcli11-dev
   android-liblog-dev
-  espeak-ng
+  espeak-ng xmp fb-music-high
 )
 
 # Optional groups: --fuzz (clang and its fuzzer runtime), --arm64 (the

@@ -1,7 +1,10 @@
 #include "tools/modem_options.h"
 
 #include <cctype>
+#include <cmath>
 #include <cstdio>
+
+#include "audio/hotsound_detector.h"
 
 namespace sorvel_cli {
 
@@ -110,6 +113,17 @@ std::string ToHex(const std::vector<uint8_t>& bytes) {
     hex += pair;
   }
   return hex;
+}
+
+std::string CheckHotsoundRate(double rate) {
+  using audio_sorvane::HotsoundDetector;
+  const double carrier = audio_sorvane::HotsoundDetectorConfig().frequency;
+  // The detector is built for the whole-Hz rate.
+  if (HotsoundDetector::RateFits(std::floor(rate), carrier)) return "";
+  const int needed = static_cast<int>(2 * (carrier + HotsoundDetector::kHalfBandwidth)) + 1;
+  return "--hotsound needs a sample rate of at least " + std::to_string(needed) + " Hz (the " +
+         std::to_string(static_cast<int>(std::lround(carrier))) + " Hz carrier and its band), got " +
+         std::to_string(static_cast<int>(rate)) + " Hz";
 }
 
 }  // namespace sorvel_cli

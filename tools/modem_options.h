@@ -34,6 +34,10 @@ struct ModemOptions {
 // `transmitter`, also the settings only the sender has.
 void AddModemOptions(CLI::App* command, ModemOptions* options, bool transmitter);
 
+// Why the hotsound wake-up detector cannot listen at `rate` Hz (its
+// carrier band does not fit below half the rate), or "".
+std::string CheckHotsoundRate(double rate);
+
 // Resolves the scheme defaults into options.dsss / options.dtmf and checks
 // them. Returns an empty string or a one-line problem.
 std::string ResolveModemOptions(ModemOptions& options);

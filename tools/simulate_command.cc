@@ -240,6 +240,9 @@ int RunEval(EvalOptions& o) {
   std::stringstream in(o.schemes);
   for (std::string s; std::getline(in, s, ',');) {
     if (s != "dsss" && s != "hotsound" && s != "dtmf") return fail("unknown scheme " + s);
+    if (s == "hotsound") {
+      if (std::string e = CheckHotsoundRate(o.channel.config.output_rate); !e.empty()) return fail(e);
+    }
     schemes.push_back(s);
   }
   if (o.seeds < 1 || o.snr_step <= 0 || o.snr_max < o.snr_min || o.seconds <= 0) {

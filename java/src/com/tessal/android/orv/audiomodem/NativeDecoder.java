@@ -24,7 +24,15 @@ public final class NativeDecoder {
 
   private NativeDecoder() {}
 
-  /** A DSSS decoder, optionally behind the hotsound wake-up detector. */
+  /**
+   * A DSSS decoder, optionally behind the hotsound wake-up detector.
+   *
+   * <p>With {@code withHotsound}, {@code inputSampleRate} must leave room for the
+   * detector's band, the 18496 Hz carrier plus 2 kHz below half the rate: at
+   * least 40993 Hz (44100 and 48000 Hz work; 32000 and 16000 Hz do not). A
+   * rate that does not fit is a programming error that ends the process, so
+   * check the rate before asking for hotsound.
+   */
   public static native boolean nativeInitializeDsss(
       int decoderId,
       int tokenLengthBytes,
@@ -71,7 +79,11 @@ public final class NativeDecoder {
   public static native void nativeProcessSamples(
       int decoderId, ByteBuffer buffer, int offsetBytes, int lengthBytes);
 
-  /** Raw samples for a hotsound decoder; other decoders ignore them. */
+  /**
+   * Raw samples for a hotsound decoder; other decoders ignore them. Such a
+   * decoder exists only at input rates of 40993 Hz and above (see {@link
+   * #nativeInitializeDsss}).
+   */
   public static native void nativeProcessSamplesWithHotsound(
       int decoderId, ByteBuffer buffer, int offsetBytes, int lengthBytes);
 

@@ -1,0 +1,121 @@
+// The wake-up detector of the hotsound receiver: decides cheaply, from a
+// fraction of the audio, whether a DSSS broadcast is on the air.
+//
+// Every DSSS frame carries the same spreading code on a constant pedestal of
+// the carrier, so the broadcast is periodic in the frame length whatever the
+// symbols. Every kHopFrames frames the detector takes one frame's worth of
+// audio ("window"), mixes it down from the carrier and low-passes it into
+// kBasebandSize complex samples (two per chip), and correlates that with
+// the code at every cyclic lag (half-chip steps) for kDopplerBins carrier
+// offsets one window-bin (23 Hz) apart, through one forward and
+// kDopplerBins inverse FFTs. Each window's correlation powers are divided by
+// their mean, so the statistic does not depend on the level or the spectral
+// tilt of the audio: noise, speech, music, tones and clicks spread evenly
+// over the lags, the code piles up at one. A score adds windows along a lag
+// track (each step may move one lag around the drift that the carrier
+// offset implies, which follows a moving phone) and takes the best track
+// and offset, twice: over the last kWindows windows (about 0.5 s, for a
+// quick wake) and over the last kLongWindows (about 1 s, for weak or
+// reverberant broadcasts), each against its own threshold; 25.0 means a
+// broadcast.
+//
+// Scores depend only on the audio of the last kLongWindows windows, not on
+// how it was split into blocks. Not thread safe.
+#ifndef AUDIO_HOTSOUND_DETECTOR_H_
+#define AUDIO_HOTSOUND_DETECTOR_H_
+
+#include <complex>
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <vector>
+
+#include "audio/dsp/kiss_fft.h"
+
+namespace audio_sorvane {
+
+// The detector's configuration, as built from the input sample rate and the
+// decimation step. The core uses the sample rate and the carrier frequency;
+// the other values describe the original detector's fixed-point scales and
+// hop and are carried unchanged.
+struct HotsoundDetectorConfig {
+  int32_t sample_rate = 44100;
+  float frequency = 18496.0625f;  // Hz, the default DSSS carrier
+  int64_t sample_rate_scale = 0;  // sample_rate * 2032
+  int64_t time_scale = 12288000;
+  int32_t min_hops_over_threshold = 1;
+  int32_t num_detections_required = 1;
+  int32_t flags = 0;
+  int64_t hop_size = 256;
+};
+
+class HotsoundDetector {
+ public:
+  static constexpr float kThreshold = 25.0f;
+  // Half the width of the band the detector needs around the carrier: the
+  // code's main band (half the chip rate), the symbol tones and Doppler.
+  static constexpr double kHalfBandwidth = 2000.0;
+  static constexpr int kBasebandSize = 256;  // complex samples per window
+  static constexpr int kDopplerBins = 5;
+  static constexpr int kHopFrames = 3;  // frames from one window to the next
+  static constexpr int kWindows = 4;    // windows a score adds up
+  static constexpr int kLongWindows = 8;  // ... and the slower, finer one
+
+  // Null when the configuration cannot make a detector: a bad rate or hop,
+  // or a carrier band that does not fit below half the sample rate.
+  static std::unique_ptr<HotsoundDetector> Create(const HotsoundDetectorConfig& config,
+                                                  int step);
+  // Whether a detector of the carrier `frequency` can run at `sample_rate`.
+  static bool RateFits(double sample_rate, double frequency);
+
+  // Decimates the block in place by the step (pair averages, which mix
+  // interleaved stereo down to mono) and scores the windows it completes.
+  // Returns the highest score of those windows, or the current score if
+  // the block completed none.
+  float Process(std::span<int16_t> samples);
+  bool Detected(float score) const { return score > kThreshold; }
+
+  int step() const { return step_; }
+  float score() const { return score_; }
+
+ private:
+  HotsoundDetector(const HotsoundDetectorConfig& config, int step);
+  void ScoreWindow();
+  void ExtendTrack(float* row, const float* powers, float scale, int drift);
+
+  HotsoundDetectorConfig config_;
+  int step_;
+  int window_size_ = 0;  // input samples one window reads
+  int hop_samples_ = 0;
+  int taps_ = 0;         // filter taps per baseband sample, a multiple of 8
+  // Per baseband sample: first input sample, and taps_ real and imaginary
+  // coefficients of the mixing low-pass filter.
+  std::vector<int> tap_start_;
+  std::vector<float> taps_re_, taps_im_;
+  // conj(code spectrum) on the window's bins; zero outside the code band.
+  std::vector<std::complex<float>> code_spectrum_;
+  std::vector<int> code_bins_;  // bins where code_spectrum_ is not zero
+  audio_dsp::ComplexFFTTransformer fft_;
+
+  std::vector<float> window_;  // the current window's input so far
+  int fill_ = 0;
+  int skip_ = 0;               // input samples to drop before the next window
+  std::vector<std::complex<float>> baseband_, spectrum_, product_, lags_;
+  // The last kWindows windows' correlation powers, kDopplerBins x
+  // kBasebandSize each, oldest first from ring_next_.
+  std::vector<std::vector<float>> ring_;
+  std::vector<float> scales_;  // per window: 1 / mean power, 0 if silent
+  int ring_next_ = 0;
+  std::vector<int> drift_;  // per carrier offset: lags the code moves per window
+  // Per window slot, the short track that ended there; the long track.
+  std::vector<std::vector<float>> short_tracks_;
+  std::vector<float> long_track_, pooled_;
+  float score_ = 0.0f;
+};
+
+// The configuration from the integer input rate and the step (channels).
+std::unique_ptr<HotsoundDetector> MakeHotsoundDetector(int sample_rate, int step);
+
+}  // namespace audio_sorvane
+
+#endif  // AUDIO_HOTSOUND_DETECTOR_H_
