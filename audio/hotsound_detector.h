@@ -11,13 +11,14 @@
 // kDopplerBins inverse FFTs. Each window's correlation powers are divided by
 // their mean, so the statistic does not depend on the level or the spectral
 // tilt of the audio: noise, speech, music, tones and clicks spread evenly
-// over the lags, the code piles up at one. A score adds windows along a lag
+// over the lags, the code piles up at one, or in a room over the few
+// milliseconds of its early reflections. A score adds windows along a lag
 // track (each step may move one lag around the drift that the carrier
 // offset implies, which follows a moving phone) and takes the best track
-// and offset, twice: over the last kWindows windows (about 0.5 s, for a
-// quick wake) and over the last kLongWindows (about 1 s, for weak or
-// reverberant broadcasts), each against its own threshold; 25.0 means a
-// broadcast.
+// and offset, for two statistics (single lags, and the sum over 5.4 ms of
+// lags) and two lengths: the last kWindows windows (about 0.5 s, for a
+// quick wake) and the last kLongWindows (about 1 s, for weak broadcasts),
+// each against its own threshold; 25.0 means a broadcast.
 //
 // Scores depend only on the audio of the last kLongWindows windows, not on
 // how it was split into blocks. Not thread safe.
@@ -80,8 +81,28 @@ class HotsoundDetector {
 
  private:
   HotsoundDetector(const HotsoundDetectorConfig& config, int step);
+  // Tracks over one kind of lag statistic: single lags, or sums over a
+  // span of lags (a room's early reflections) at a coarser stride.
+  struct Family {
+    int lags = 0;    // statistics per window and carrier offset
+    int stride = 1;  // lags from one statistic to the next
+    int pool = 1;    // lags one statistic adds
+    float threshold = 0.0f, long_threshold = 0.0f;  // raw track sums that score 1
+    int row = 0;     // lags + cyclic padding
+    std::vector<int> drift;  // per carrier offset: statistics the code moves per window
+    // The last kLongWindows windows' statistics, kDopplerBins x lags each.
+    std::vector<std::vector<float>> ring;
+    // Per window slot, the short track that ended there; the long track.
+    std::vector<std::vector<float>> short_tracks;
+    std::vector<float> long_track;
+  };
+
   void ScoreWindow();
-  void ExtendTrack(float* row, const float* powers, float scale, int drift);
+  // Adds the window in `newest` to the family's tracks; returns the higher
+  // of its short and long track sums' excess over noise, each relative to
+  // its threshold's (1: on the air).
+  float UpdateTracks(Family& f, int newest);
+  void ExtendTrack(const Family& f, float* row, const float* powers, float scale, int drift);
 
   HotsoundDetectorConfig config_;
   int step_;
@@ -101,15 +122,10 @@ class HotsoundDetector {
   int fill_ = 0;
   int skip_ = 0;               // input samples to drop before the next window
   std::vector<std::complex<float>> baseband_, spectrum_, product_, lags_;
-  // The last kWindows windows' correlation powers, kDopplerBins x
-  // kBasebandSize each, oldest first from ring_next_.
-  std::vector<std::vector<float>> ring_;
-  std::vector<float> scales_;  // per window: 1 / mean power, 0 if silent
-  int ring_next_ = 0;
-  std::vector<int> drift_;  // per carrier offset: lags the code moves per window
-  // Per window slot, the short track that ended there; the long track.
-  std::vector<std::vector<float>> short_tracks_;
-  std::vector<float> long_track_, pooled_;
+  Family families_[2];
+  std::vector<float> scales_;  // per window slot: 1 / mean power, 0 if silent
+  int ring_next_ = 0;          // the slot the next window goes to
+  std::vector<float> powers_, pooled_;
   float score_ = 0.0f;
 };
 

@@ -209,52 +209,84 @@ int Duty(double minutes) {
   return 0;
 }
 
-// Time from the start of a broadcast to the wake, over `seeds` broadcasts
-// (random points of the token loop) at each full-band SNR, for white and
-// pink noise and speeds of 0 and +-1 m/s; prints the share woken within
-// 0.5 s, the median latency and the median peak score in that half second.
+// Wake times over `seeds` broadcasts (random messages looped from random
+// points, each after a second of the channel's noise) through `channel`
+// (its seed varied per broadcast): the share woken within 0.5 s of the
+// broadcast's start, the median latency and the median peak score in that
+// half second.
+struct WakeStats {
+  int woken_percent;
+  double median_latency, median_peak;
+};
+
+WakeStats MeasureWakes(audio_sorvane::AudioModemEncoder& encoder, sorvel_sim::ChannelConfig channel,
+                       int seeds) {
+  std::vector<double> latency, peak;
+  int woken = 0;
+  for (int s = 0; s < seeds; ++s) {
+    std::mt19937_64 rng(77 + s);
+    std::vector<uint8_t> message(6);
+    for (uint8_t& b : message) b = static_cast<uint8_t>(rng());
+    std::vector<float> token;
+    encoder.Encode(message, &token, 2);
+    std::vector<float> loop = sorvel_sim::RenderLoopedBroadcast(encoder, token, 3.0);
+    loop.erase(loop.begin(), loop.begin() + std::uniform_int_distribution<size_t>(0, token.size())(rng));
+    loop.resize(static_cast<size_t>(1.0 * kRate));
+    channel.leading_silence = 1.0;
+    channel.seed = 500ULL + s;
+    std::vector<int16_t> pcm = ToPcm(sorvel_sim::ApplyChannel(loop, channel));
+    auto detector = audio_sorvane::MakeHotsoundDetector(44100, 1);
+    const size_t begin = static_cast<size_t>(kRate);
+    double t = INFINITY;
+    float best = 0.0f;
+    for (size_t start = 0; start < pcm.size(); start += 441) {
+      const size_t n = std::min<size_t>(441, pcm.size() - start);
+      const float score = detector->Process(std::span<int16_t>(pcm).subspan(start, n));
+      if (start + n > begin && start + n <= begin + kRate / 2) best = std::max(best, score);
+      if (detector->Detected(score) && !std::isfinite(t)) t = (start + n - double(begin)) / kRate;
+    }
+    woken += t <= 0.5;
+    latency.push_back(t);
+    peak.push_back(best);
+  }
+  std::sort(latency.begin(), latency.end());
+  std::sort(peak.begin(), peak.end());
+  return {100 * woken / seeds, latency[seeds / 2], peak[seeds / 2]};
+}
+
+// Wake times for white and pink noise at several full-band SNRs, senders at
+// rest and at +-1 m/s, then in three rooms at several distances (+10 dB).
 int Latency(int seeds) {
   const auto encoder = audio_sorvane::MakeDsssEncoder({});
-  std::printf("%-6s %6s %7s %10s %12s %12s\n", "noise", "speed", "SNR dB", "woken<0.5s",
+  std::printf("%-22s %6s %7s %10s %12s %12s\n", "channel", "speed", "SNR dB", "woken<0.5s",
               "median s", "median score");
+  const auto print = [](const char* name, double speed, double snr, const WakeStats& w) {
+    std::printf("%-22s %6.1f %7.1f %9d%% %12.3f %12.1f\n", name, speed, snr, w.woken_percent,
+                w.median_latency, w.median_peak);
+    std::fflush(stdout);
+  };
   for (NoiseKind kind : {NoiseKind::kWhite, NoiseKind::kPink}) {
     for (double speed : {0.0, -1.0, 1.0}) {
       if (kind == NoiseKind::kPink && speed != 0.0) continue;
       for (double snr : {-10.0, -14.0, -16.0, -18.0, -20.0}) {
-        std::vector<double> latency, peak;
-        int woken = 0;
-        for (int s = 0; s < seeds; ++s) {
-          std::mt19937_64 rng(77 + s);
-          std::vector<uint8_t> message(6);
-          for (uint8_t& b : message) b = static_cast<uint8_t>(rng());
-          std::vector<float> token;
-          encoder->Encode(message, &token, 2);
-          std::vector<float> loop = sorvel_sim::RenderLoopedBroadcast(*encoder, token, 3.0);
-          loop.erase(loop.begin(), loop.begin() + std::uniform_int_distribution<size_t>(0, token.size())(rng));
-          loop.resize(static_cast<size_t>(1.0 * kRate));
-          sorvel_sim::ChannelConfig channel{.speed = speed, .leading_silence = 1.0, .level = 8000,
-                                            .snr_db = snr, .noise = kind, .seed = 500ULL + s};
-          std::vector<int16_t> pcm = ToPcm(sorvel_sim::ApplyChannel(loop, channel));
-          auto detector = audio_sorvane::MakeHotsoundDetector(44100, 1);
-          const size_t begin = static_cast<size_t>(kRate);
-          double t = INFINITY;
-          float best = 0.0f;
-          for (size_t start = 0; start < pcm.size(); start += 441) {
-            const size_t n = std::min<size_t>(441, pcm.size() - start);
-            const float score = detector->Process(std::span<int16_t>(pcm).subspan(start, n));
-            if (start + n > begin && start + n <= begin + kRate / 2) best = std::max(best, score);
-            if (detector->Detected(score) && !std::isfinite(t)) t = (start + n - double(begin)) / kRate;
-          }
-          woken += t <= 0.5;
-          latency.push_back(t);
-          peak.push_back(best);
-        }
-        std::sort(latency.begin(), latency.end());
-        std::sort(peak.begin(), peak.end());
-        std::printf("%-6s %6.1f %7.1f %9d%% %12.3f %12.1f\n", kind == NoiseKind::kWhite ? "white" : "pink",
-                    speed, snr, 100 * woken / seeds, latency[seeds / 2], peak[seeds / 2]);
-        std::fflush(stdout);
+        const sorvel_sim::ChannelConfig channel{.speed = speed, .level = 8000, .snr_db = snr, .noise = kind};
+        print(kind == NoiseKind::kWhite ? "white" : "pink", speed, snr, MeasureWakes(*encoder, channel, seeds));
       }
+    }
+  }
+  struct Room {
+    const char* name;
+    double width, depth, height, rt60;
+  };
+  for (const Room& room : {Room{"office", 4.0, 3.0, 2.5, 0.4}, Room{"living room", 6.0, 5.0, 2.7, 0.6},
+                           Room{"hall", 10.0, 8.0, 3.5, 1.0}}) {
+    for (double distance : {1.0, 2.0, 3.0, 5.0}) {
+      sorvel_sim::ChannelConfig channel{.level = 8000, .snr_db = 10.0};
+      channel.room = {.width = room.width, .depth = room.depth, .height = room.height, .rt60 = room.rt60,
+                      .distance = distance};
+      char name[64];
+      std::snprintf(name, sizeof(name), "%s %.0f m", room.name, distance);
+      print(name, 0.0, 10.0, MeasureWakes(*encoder, channel, seeds));
     }
   }
   return 0;
