@@ -5,6 +5,7 @@
 #include <cstring>
 #include <numbers>
 
+#include "audio/dsp/float4.h"
 #include "audio/sorvane/symbol_wave_coder.h"
 #include "base/logging.h"
 
@@ -50,14 +51,7 @@ constexpr double kDriftSign = -1.0;
 // Cyclic padding of a track row: covers the drift and one lag either side.
 constexpr int kPad = 4;
 
-// Four floats for the inner loops; GCC and Clang map it to SSE or NEON.
-typedef float V4 __attribute__((vector_size(16)));
-V4 Load(const float* p) {
-  V4 v;
-  std::memcpy(&v, p, sizeof(v));
-  return v;
-}
-float Sum(V4 v) { return (v[0] + v[1]) + (v[2] + v[3]); }
+audio_dsp::Float4 Max(audio_dsp::Float4 a, audio_dsp::Float4 b) { return a > b ? a : b; }
 
 double Blackman(double x) {  // x in [-1, 1]
   return 0.42 + 0.5 * std::cos(std::numbers::pi * x) + 0.08 * std::cos(2 * std::numbers::pi * x);
@@ -77,7 +71,7 @@ std::unique_ptr<HotsoundDetector> HotsoundDetector::Create(const HotsoundDetecto
 }
 
 HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int step)
-    : config_(config), step_(std::max(step, 1)), fft_(kN, /*normalize_inverse=*/false) {
+    : config_(config), step_(std::max(step, 1)), fft_(kN) {
   // The broadcast's frame: the default code, chip rate and frame length.
   const SymbolWaveCoderParams coder;
   const int chips = static_cast<int>(coder.code.size());
@@ -118,7 +112,8 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
 
   // The code band-limited to its chips' bins (|k| < chips / 2) and seen at
   // kN samples per frame: its spectrum is the chips' DFT on those bins.
-  code_spectrum_.assign(kN, {0.0f, 0.0f});
+  code_re_.assign(kN, 0.0f);
+  code_im_.assign(kN, 0.0f);
   for (int k = -(chips / 2); k <= chips / 2; ++k) {
     std::complex<double> sum = 0.0;
     for (int n = 0; n < chips; ++n) {
@@ -126,15 +121,16 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
              std::polar(1.0, -2.0 * std::numbers::pi * k * n / chips);
     }
     const int bin = (k + kN) % kN;
-    code_spectrum_[bin] = std::conj(std::complex<float>(sum / std::sqrt(double(chips))));
+    const std::complex<double> value = std::conj(sum) / std::sqrt(double(chips));
+    code_re_[bin] = static_cast<float>(value.real());
+    code_im_[bin] = static_cast<float>(value.imag());
     code_bins_.push_back(bin);
   }
 
   window_.resize(window_size_);
-  baseband_.resize(kN);
-  spectrum_.resize(kN);
-  product_.assign(kN, {0.0f, 0.0f});
-  lags_.resize(kN);
+  for (auto* v : {&base_re_, &base_im_, &spec_re_, &spec_im_}) v->resize(kN);
+  prod_re_.assign(kN, 0.0f);
+  prod_im_.assign(kN, 0.0f);
   // A phone moving at v compresses the broadcast by v / c: the code's lag
   // moves by the same fraction of a hop per window, and its carrier by the
   // same fraction of the carrier frequency (one bin: window_rate Hz).
@@ -208,16 +204,18 @@ void HotsoundDetector::ScoreWindow() {
     const float* x = window_.data() + tap_start_[m];
     const float* re = taps_re_.data() + static_cast<size_t>(m) * taps_;
     const float* im = taps_im_.data() + static_cast<size_t>(m) * taps_;
-    V4 r0 = {}, r1 = {}, i0 = {}, i1 = {};
+    using audio_dsp::Load4;
+    audio_dsp::Float4 r0 = {}, r1 = {}, i0 = {}, i1 = {};
     for (int t = 0; t < taps_; t += 8) {
-      const V4 x0 = Load(x + t), x1 = Load(x + t + 4);
-      r0 += x0 * Load(re + t);
-      r1 += x1 * Load(re + t + 4);
-      i0 += x0 * Load(im + t);
-      i1 += x1 * Load(im + t + 4);
+      const audio_dsp::Float4 x0 = Load4(x + t), x1 = Load4(x + t + 4);
+      r0 += x0 * Load4(re + t);
+      r1 += x1 * Load4(re + t + 4);
+      i0 += x0 * Load4(im + t);
+      i1 += x1 * Load4(im + t + 4);
     }
-    const float sr = Sum(r0 + r1), si = Sum(i0 + i1);
-    baseband_[m] = {sr, si};
+    const float sr = audio_dsp::Sum4(r0 + r1), si = audio_dsp::Sum4(i0 + i1);
+    base_re_[m] = sr;
+    base_im_[m] = si;
     const float power = sr * sr + si * si;
     energy += power;
     peak = std::max(peak, power);
@@ -230,17 +228,21 @@ void HotsoundDetector::ScoreWindow() {
   // that a regular tick lands in alike.
   float scale = 0.0f;
   if (energy >= kSilentPower * kN && peak < kMaxCrest * energy / kN) {
-    fft_.Forward(baseband_.data(), spectrum_.data());
+    fft_.Forward(base_re_.data(), base_im_.data(), spec_re_.data(), spec_im_.data());
     // Bins far above the window's mean power (sustained tones of music, a
     // whistle) are pulled down to kMaxBinPower times the mean: a few tones
     // correlate with the code into smooth lag profiles that the spread
     // statistic would take for a room. Noise and the code rarely get there.
     double band = 0.0;
-    for (int bin : code_bins_) band += std::norm(spectrum_[bin]);
+    for (int bin : code_bins_) band += spec_re_[bin] * spec_re_[bin] + spec_im_[bin] * spec_im_[bin];
     const float ceiling = static_cast<float>(kMaxBinPower * band / code_bins_.size());
-    for (std::complex<float>& x : spectrum_) {
-      const float p = std::norm(x);
-      if (p > ceiling) x *= std::sqrt(ceiling / p);
+    for (int k = 0; k < kN; ++k) {
+      const float p = spec_re_[k] * spec_re_[k] + spec_im_[k] * spec_im_[k];
+      if (p > ceiling) {
+        const float g = std::sqrt(ceiling / p);
+        spec_re_[k] *= g;
+        spec_im_[k] *= g;
+      }
     }
     // Correlation powers per offset; their total from the products (the
     // inverse transform is unnormalised: sum |c|^2 = kN sum |product|^2).
@@ -248,13 +250,19 @@ void HotsoundDetector::ScoreWindow() {
     for (int d = 0; d < kDopplerBins; ++d) {
       const int shift = d - kDopplerBins / 2;
       for (int bin : code_bins_) {
-        product_[bin] = spectrum_[(bin + shift + kN) % kN] * code_spectrum_[bin];
-        total += std::norm(product_[bin]);
+        const int from = (bin + shift + kN) % kN;
+        const float re = spec_re_[from] * code_re_[bin] - spec_im_[from] * code_im_[bin];
+        const float im = spec_re_[from] * code_im_[bin] + spec_im_[from] * code_re_[bin];
+        prod_re_[bin] = re;
+        prod_im_[bin] = im;
+        total += re * re + im * im;
       }
-      fft_.Inverse(product_.data(), lags_.data());
-      const float* c = reinterpret_cast<const float*>(lags_.data());
+      fft_.Inverse(prod_re_.data(), prod_im_.data(), base_re_.data(), base_im_.data());
       float* powers = powers_.data();
-      for (int t = 0; t < kN; ++t) powers[t] = c[2 * t] * c[2 * t] + c[2 * t + 1] * c[2 * t + 1];
+      for (int t = 0; t < kN; t += 4) {
+        const audio_dsp::Float4 re = audio_dsp::Load4(&base_re_[t]), im = audio_dsp::Load4(&base_im_[t]);
+        audio_dsp::Store4(powers + t, re * re + im * im);
+      }
       std::copy(powers, powers + kN, families_[0].ring[slot].data() + d * kN);
       // Sums of kSpreadLags lags every kSpreadStride lags, from sums of
       // kSpreadStride consecutive lags.
@@ -302,13 +310,18 @@ float HotsoundDetector::UpdateTracks(Family& f, int newest) {
       ExtendTrack(f, long_track + d * f.row, e, scales_[slot], f.drift[d]);
     }
   }
-  float raw_short = 0.0f, raw_long = 0.0f;
+  using audio_dsp::Float4;
+  Float4 short_max = {}, long_max = {};
   for (int d = 0; d < kDopplerBins; ++d) {
     const float* a = short_track + d * f.row + kPad;
     const float* b = long_track + d * f.row + kPad;
-    raw_short = std::max(raw_short, *std::max_element(a, a + f.lags));
-    raw_long = std::max(raw_long, *std::max_element(b, b + f.lags));
+    for (int t = 0; t < f.lags; t += 4) {
+      short_max = Max(short_max, audio_dsp::Load4(a + t));
+      long_max = Max(long_max, audio_dsp::Load4(b + t));
+    }
   }
+  const float raw_short = std::max(std::max(short_max[0], short_max[1]), std::max(short_max[2], short_max[3]));
+  const float raw_long = std::max(std::max(long_max[0], long_max[1]), std::max(long_max[2], long_max[3]));
   // Noise sums to f.pool per window on average; relative to what the
   // thresholds add to that, so a score near 0 means noise for either family.
   const float mean = static_cast<float>(f.pool);
@@ -324,8 +337,11 @@ void HotsoundDetector::ExtendTrack(const Family& f, float* row, const float* pow
   std::copy(row + n, row + n + kPad, row);
   std::copy(row + kPad, row + 2 * kPad, row + n + kPad);
   const float* from = row + kPad - drift;
-  for (int t = 0; t < n; ++t) {
-    pooled_[t] = scale * powers[t] + std::max(std::max(from[t - 1], from[t]), from[t + 1]);
+  using audio_dsp::Load4;
+  const audio_dsp::Float4 gain = audio_dsp::Splat4(scale);
+  for (int t = 0; t < n; t += 4) {
+    const audio_dsp::Float4 best = Max(Max(Load4(from + t - 1), Load4(from + t)), Load4(from + t + 1));
+    audio_dsp::Store4(pooled_.data() + t, gain * Load4(powers + t) + best);
   }
   std::copy(pooled_.begin(), pooled_.begin() + n, row + kPad);
 }

@@ -31,7 +31,7 @@
 #include <span>
 #include <vector>
 
-#include "audio/dsp/kiss_fft.h"
+#include "audio/dsp/radix4_fft.h"
 
 namespace audio_sorvane {
 
@@ -113,15 +113,18 @@ class HotsoundDetector {
   // coefficients of the mixing low-pass filter.
   std::vector<int> tap_start_;
   std::vector<float> taps_re_, taps_im_;
-  // conj(code spectrum) on the window's bins; zero outside the code band.
-  std::vector<std::complex<float>> code_spectrum_;
-  std::vector<int> code_bins_;  // bins where code_spectrum_ is not zero
-  audio_dsp::ComplexFFTTransformer fft_;
+  // conj(code spectrum) on the window's bins, real and imaginary parts;
+  // zero outside the code band.
+  std::vector<float> code_re_, code_im_;
+  std::vector<int> code_bins_;  // bins where the code spectrum is not zero
+  audio_dsp::Radix4Fft fft_;
 
   std::vector<float> window_;  // the current window's input so far
   int fill_ = 0;
   int skip_ = 0;               // input samples to drop before the next window
-  std::vector<std::complex<float>> baseband_, spectrum_, product_, lags_;
+  // The window mixed down (and, once correlated, its lags); its spectrum;
+  // the spectrum times the code's.
+  std::vector<float> base_re_, base_im_, spec_re_, spec_im_, prod_re_, prod_im_;
   Family families_[2];
   std::vector<float> scales_;  // per window slot: 1 / mean power, 0 if silent
   int ring_next_ = 0;          // the slot the next window goes to
