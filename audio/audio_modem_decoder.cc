@@ -100,7 +100,12 @@ bool AudioModemDecoder::DecodeTokens(DecodeResults* decode_results, int num_mess
       found = dtmf_decoder_->GetToken(&raw);
       break;
   }
-  if (!found) return false;
+  // In a reverberant room the energy scores of the multi-tone receiver
+  // may give no candidate that passes the CRC; its coherent room-model
+  // search is then asked as well. The CRC decides, so this is only done
+  // when check bytes are present.
+  const bool try_room = kind_ == kDtmf && num_crc_check_bytes == 2;
+  if (!found && !try_room) return false;
 
   const auto result = [](const DecodedToken& candidate, std::vector<uint8_t> bytes) {
     return TokenResult{std::move(bytes), candidate.position,
@@ -121,6 +126,14 @@ bool AudioModemDecoder::DecodeTokens(DecodeResults* decode_results, int num_mess
     }
     decode_results->detection_times = std::move(raw.detection_times);
     decode_results->detection_scores = std::move(raw.detection_scores);
+    if (decode_results->tokens.empty() && try_room && dtmf_decoder_->GetReverberantToken(&raw)) {
+      for (const DecodedToken& candidate : raw.tokens) {
+        if (!coder.Verify(candidate.bytes)) continue;
+        decode_results->tokens.push_back(result(
+            candidate, std::vector<uint8_t>(candidate.bytes.begin(), candidate.bytes.end() - 2)));
+        break;  // the best fit that passes: later ones only add false-pass risk
+      }
+    }
     return !decode_results->tokens.empty();
   }
   LOG(ERROR) << "Unsupported value for num_crc_check_bytes";

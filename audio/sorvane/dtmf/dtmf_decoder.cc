@@ -49,6 +49,11 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
   CHECK(params.max_candidates_rank > 0);
   CHECK(params.max_candidates_per_decode_token_call > 0);
   CHECK(params.token_threshold_factor >= 0);
+  CHECK(params.room_search.settle_frames >= 0);
+  CHECK(params.room_search.max_frames > 0);
+  CHECK(params.room_search.timing_candidates > 0);
+  CHECK(params.room_search.timings_searched > 0);
+  CHECK(params.room_search.max_tokens > 0);
 
   num_frequencies_ = static_cast<int>(params_.tone_frequencies.size());
   frame_size_ = FrameSize(params_);
@@ -69,6 +74,33 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
                                         params_.sample_rate, tone, cutoff);
   }
   tone_strength_buffers_.resize(num_frequencies_);
+
+  // The coherent path, when the token layout fits the search's limits.
+  const RoomSearchParams& room = params_.room_search;
+  ToneSequenceSearchParams search;
+  search.num_tones = num_frequencies_;
+  search.period = converter_.symbols_in_token() + (params_.use_checksum_symbol ? 1 : 0) + 1;
+  search.tones_per_symbol = params_.tones_per_symbol;
+  search.num_taps = room.num_taps;
+  search.masks_per_tone = room.masks_per_tone;
+  if (room.enabled && ToneSequenceSearch::Supported(search)) {
+    sequence_search_ = std::make_unique<ToneSequenceSearch>(search);
+    tone_block_buffers_.resize(num_frequencies_);
+    for (const ToneStrengthFilter& filter : tone_strength_filters_) {
+      frame_phase_steps_.push_back(static_cast<uint32_t>(params_.baseband_decimation_factor) *
+                                   filter.phase_increment());
+    }
+    frame_window_.resize(baseband_frame_size_);
+    for (int m = 0; m < baseband_frame_size_; ++m) {
+      frame_window_[m] = static_cast<float>(
+          std::sin(std::numbers::pi * (m + 0.5) / baseband_frame_size_));
+    }
+    for (size_t s = 0; s < params_.symbol_table.size(); ++s) {
+      uint32_t bits = 0;
+      for (int tone : params_.symbol_table[s]) bits |= 1u << tone;
+      symbol_of_tones_[bits] = static_cast<int>(s);
+    }
+  }
 }
 
 void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
@@ -92,6 +124,7 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   tone_strength_buffer_size_ = 0;
   for (ToneStrengthFilter& filter : tone_strength_filters_) filter.Reset();
   for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Clear();
+  for (StreamBuffer& buffer : tone_block_buffers_) buffer.Clear();
   tone_scores_.resize(0, 0);
   column_signal_.clear();
   column_noise_.clear();
@@ -134,6 +167,7 @@ void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
     const int drop = std::min(audio_dsp::RoundUpToMultiple(drop_baseband, baseband_frame_size_),
                               tone_strength_buffer_size_);
     for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Discard(drop);
+    for (StreamBuffer& buffer : tone_block_buffers_) buffer.Discard(2 * drop);
     tone_strength_buffer_size_ -= drop;
   }
 
@@ -154,7 +188,13 @@ void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
   }
   int added = 0;
   for (int i = 0; i < num_frequencies_; ++i) {
-    tone_strength_filters_[i].ProcessSamples(mono, &strengths_);
+    if (sequence_search_) {
+      tone_strength_filters_[i].ProcessSamples(mono, &strengths_, &block_sums_);
+      tone_block_buffers_[i].Append(std::span<const float>(
+          reinterpret_cast<const float*>(block_sums_.data()), 2 * block_sums_.size()));
+    } else {
+      tone_strength_filters_[i].ProcessSamples(mono, &strengths_);
+    }
     tone_strength_buffers_[i].Append(strengths_);
     if (i == 0) added = static_cast<int>(strengths_.size());
     CHECK_EQ(tone_strength_buffers_[i].size(), tone_strength_buffer_size_ + added);
@@ -373,6 +413,126 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
     if (static_cast<int>(candidate.bytes.size()) == params_.bytes_in_token) {
       decode_results->tokens.push_back(std::move(candidate));
     }
+  }
+  return !decode_results->tokens.empty();
+}
+
+}  // namespace audio_sorvane
+
+namespace audio_sorvane {
+
+// Frame n's window starts at buffer index first + n * P. The block sums
+// carry the receiver oscillator's phase, which advances by a tone-dependent
+// amount from frame to frame while every transmitted frame starts at phase
+// 0; turning each frame back by the oscillator phase at its start leaves
+// one constant phase per tone, which the room taps absorb.
+void DtmfDecoder::FrameAmplitudes(int first, int count, audio_dsp::ComplexMatrix* frames) const {
+  const int period = baseband_frame_size_;
+  const uint32_t begin =
+      static_cast<uint32_t>(tone_strength_buffers_[0].num_discarded_samples());
+  frames->resize(count, num_frequencies_);
+  for (int k = 0; k < num_frequencies_; ++k) {
+    const float* z = tone_block_buffers_[k].View(0).data();
+    for (int n = 0; n < count; ++n) {
+      const int start = first + n * period;
+      float re = 0.0f, im = 0.0f;
+      for (int m = 0; m < period; ++m) {
+        re += frame_window_[m] * z[2 * (start + m)];
+        im += frame_window_[m] * z[2 * (start + m) + 1];
+      }
+      const uint32_t phase = (begin + static_cast<uint32_t>(start)) * frame_phase_steps_[k];
+      const double angle = -2.0 * std::numbers::pi * (phase / 4294967296.0);
+      (*frames)(n, k) = std::complex<float>(re, im) *
+                        std::complex<float>(static_cast<float>(std::cos(angle)),
+                                            static_cast<float>(std::sin(angle)));
+    }
+  }
+}
+
+bool DtmfDecoder::TokenFromMasks(const std::vector<uint32_t>& tone_masks,
+                                 DecodedToken* token) const {
+  const int period = sequence_search_->params().period;
+  std::vector<int> loop(period);
+  int spacer_at = -1;
+  for (int p = 0; p < period; ++p) {
+    uint32_t bits = 0;
+    for (int k = 0; k < num_frequencies_; ++k) {
+      if (tone_masks[k] >> p & 1) bits |= 1u << k;
+    }
+    const auto it = symbol_of_tones_.find(bits);
+    if (it == symbol_of_tones_.end()) return false;
+    loop[p] = it->second;
+    if (loop[p] == params_.spacer_symbol) {
+      if (spacer_at >= 0) return false;
+      spacer_at = p;
+    }
+  }
+  if (spacer_at < 0) return false;
+  std::vector<int> symbols(period - 1);
+  for (int i = 0; i < period - 1; ++i) symbols[i] = loop[(spacer_at + 1 + i) % period];
+  if (params_.use_checksum_symbol) {
+    const int check = symbols.back();
+    symbols.pop_back();
+    if (ComputeCheckSymbol(static_cast<int>(params_.symbol_table.size()), symbols) != check) {
+      return false;
+    }
+  }
+  token->bytes = converter_.SymbolsToBytes(symbols);
+  if (static_cast<int>(token->bytes.size()) != params_.bytes_in_token) return false;
+  token->symbols = std::move(symbols);
+  token->position = spacer_at;
+  return true;
+}
+
+bool DtmfDecoder::GetReverberantToken(DecodeResults* decode_results) {
+  if (!initialized_) {
+    LOG(ERROR) << "GetReverberantToken() called before call to Init().";
+    return false;
+  }
+  CHECK(decode_results);
+  decode_results->Clear();
+  if (!sequence_search_) return false;
+  const RoomSearchParams& room = params_.room_search;
+  const int frame = baseband_frame_size_;
+  const int length = tone_strength_buffer_size_;
+  const int begin = tone_strength_buffers_[0].num_discarded_samples();
+  const int earliest = std::max(0, room.settle_frames * frame - begin);
+  const int loop = sequence_search_->params().period;
+
+  struct Fit {
+    double cost;
+    std::vector<uint32_t> masks;
+  };
+  std::vector<Fit> fits;
+  audio_dsp::ComplexMatrix frames;
+  for (int c = 0; c < room.timing_candidates; ++c) {
+    const int offset = c * frame / room.timing_candidates;
+    int first = earliest + audio_dsp::PositiveModulo(offset - (begin + earliest), frame);
+    int count = std::max(length - first, 0) / frame;
+    if (count > room.max_frames) {
+      first += (count - room.max_frames) * frame;
+      count = room.max_frames;
+    }
+    if (count < 2 * loop) continue;
+    FrameAmplitudes(first, count, &frames);
+    Fit fit;
+    if (!sequence_search_->Search(frames, &fit.masks, &fit.cost)) continue;
+    const double energy = frames.cwiseAbs2().sum();
+    if (!(energy > 0.0)) continue;
+    fit.cost /= energy;
+    fits.push_back(std::move(fit));
+  }
+  std::sort(fits.begin(), fits.end(),
+            [](const Fit& a, const Fit& b) { return a.cost < b.cost; });
+  for (const Fit& fit : fits) {
+    if (static_cast<int>(decode_results->tokens.size()) >= room.max_tokens) break;
+    DecodedToken token;
+    if (!TokenFromMasks(fit.masks, &token)) continue;
+    token.score = static_cast<float>(1.0 - fit.cost);
+    const bool seen = std::any_of(
+        decode_results->tokens.begin(), decode_results->tokens.end(),
+        [&](const DecodedToken& t) { return t.symbols == token.symbols; });
+    if (!seen) decode_results->tokens.push_back(std::move(token));
   }
   return !decode_results->tokens.empty();
 }

@@ -15,14 +15,18 @@
 #ifndef AUDIO_SORVANE_DTMF_DTMF_DECODER_H_
 #define AUDIO_SORVANE_DTMF_DTMF_DECODER_H_
 
+#include <complex>
+#include <cstdint>
 #include <memory>
 #include <span>
+#include <unordered_map>
 #include <vector>
 
 #include "audio/dsp/eigen_types.h"
 #include "audio/dsp/rational_factor_resampler.h"
 #include "audio/sorvane/dtmf/byte_symbol_converter.h"
 #include "audio/sorvane/dtmf/dtmf_encoder_params.h"
+#include "audio/sorvane/dtmf/tone_sequence_search.h"
 #include "audio/sorvane/dtmf/tone_strength_filter.h"
 #include "audio/sorvane/sorvane_decoder.h"
 #include "audio/sorvane/stream_buffer.h"
@@ -42,6 +46,26 @@ struct ToneNormalizationParams {
   // Added to every normaliser (squared 16-bit units): keeps digital silence
   // at 0 instead of 0 / 0, far below any audible tone.
   float division_floor = 1.0f;
+};
+
+// The coherent receiver for reverberant rooms (GetReverberantToken).
+struct RoomSearchParams {
+  bool enabled = true;
+  // Room taps per tone and candidate masks per tone (ToneSequenceSearch).
+  int num_taps = 6;
+  int masks_per_tone = 8;
+  // Frames after Init that are never used: the broadcast may start with
+  // the recording, and a loop that has just started (or a microphone's gain
+  // control that is still settling) does not fit the steady-state model.
+  int settle_frames = 10;
+  // The newest frames fitted (at least two loops are needed).
+  int max_frames = 40;
+  // Frame timings tried, evenly spread over one frame; the search runs for
+  // the best few of them by their unconstrained fit.
+  int timing_candidates = 8;
+  int timings_searched = 4;
+  // Candidates returned, best fit first.
+  int max_tokens = 3;
 };
 
 // The tone parameters shared with the encoder, then the receiver's own.
@@ -66,6 +90,7 @@ struct DtmfDecoderParams : DtmfEncoderParams {
   int max_candidates_rank = 6;
   int max_candidates_per_decode_token_call = 2;
   float token_threshold_factor = 1.0f / 3.0f;
+  RoomSearchParams room_search;
 };
 
 class DtmfDecoder {
@@ -83,6 +108,13 @@ class DtmfDecoder {
   // recorded slots' times and acquisition scores as diagnostics. True if
   // any candidate was found.
   bool GetToken(DecodeResults* decode_results);
+  // Candidates from coherent frame amplitudes with a fitted room response
+  // per tone (see ToneSequenceSearch): for reverberant rooms, where the
+  // tails of earlier frames mask the energy scores. Costlier than GetToken
+  // and without a score table; meant for when GetToken's candidates fail
+  // the CRC. Needs at least settle_frames + two loops of audio; false when
+  // disabled, unsupported by the token layout, or nothing was found.
+  bool GetReverberantToken(DecodeResults* decode_results);
   // The largest block (samples, channels interleaved) one call can take
   // without cutting into a token held in the buffer; 0 before Init.
   int GetMaxSafeInputSize() const;
@@ -101,6 +133,12 @@ class DtmfDecoder {
   void UpdateColumnScores();
   void ComputeColumns(int first, int last, audio_dsp::RowMajorFloatMatrix* scores,
                       std::vector<float>* signal, std::vector<float>* noise);
+  // Matched-filter outputs of `count` frames starting at buffer index
+  // `first`, one row per frame, phase-aligned across frames.
+  void FrameAmplitudes(int first, int count, audio_dsp::ComplexMatrix* frames) const;
+  // A token read from per-tone loop masks; false unless the loop holds
+  // exactly one spacer and valid symbols.
+  bool TokenFromMasks(const std::vector<uint32_t>& tone_masks, DecodedToken* token) const;
 
   DtmfDecoderParams params_;
   ByteSymbolConverter converter_;
@@ -122,6 +160,15 @@ class DtmfDecoder {
   bool initialized_ = false;
 
   std::vector<float> mono_, resampled_, strengths_;  // scratch
+
+  // Coherent path: per tone the raw block sums (interleaved real,
+  // imaginary), kept in step with tone_strength_buffers_.
+  std::vector<StreamBuffer> tone_block_buffers_;
+  std::vector<std::complex<float>> block_sums_;  // scratch
+  std::vector<uint32_t> frame_phase_steps_;      // oscillator turn per frame, 2^-32
+  std::vector<float> frame_window_;              // per baseband sample of a frame
+  std::unordered_map<uint32_t, int> symbol_of_tones_;  // tone bit set -> symbol
+  std::unique_ptr<ToneSequenceSearch> sequence_search_;
 
   // Per-column results of the last GetToken, for the columns of the buffers
   // as they were then, starting at stream index columns_begin_.

@@ -61,9 +61,19 @@ void ToneStrengthFilter::Reset() {
 
 void ToneStrengthFilter::ProcessSamples(std::span<const float> input,
                                         std::vector<float>* output_samples) {
+  ProcessSamples(input, output_samples, nullptr);
+}
+
+void ToneStrengthFilter::ProcessSamples(std::span<const float> input,
+                                        std::vector<float>* output_samples,
+                                        std::vector<std::complex<float>>* block_sums) {
   CHECK(output_samples);
   output_samples->clear();
   output_samples->reserve(input.size() / decimation_factor_ + 1);
+  if (block_sums) {
+    block_sums->clear();
+    block_sums->reserve(input.size() / decimation_factor_ + 1);
+  }
   // Locals let the compiler keep the loop state in registers.
   uint32_t phase = phase_;
   float acc_re = accumulator_.real();
@@ -77,6 +87,7 @@ void ToneStrengthFilter::ProcessSamples(std::span<const float> input,
     phase += phase_increment_;
     if (--countdown == 0) {
       const std::complex<float> z(acc_re, acc_im);
+      if (block_sums) block_sums->push_back(z);
       acc_re = 0.0f;
       acc_im = 0.0f;
       countdown = decimation_factor_;

@@ -42,11 +42,18 @@ class ToneStrengthFilter {
   // `input`.
   void ProcessSamples(std::span<const float> input,
                       std::vector<float>* output_samples);
+  // As above, and when `block_sums` is given it is replaced with the raw
+  // (unsmoothed) complex sum of every completed block, sum x * e^{j phase}:
+  // the tone's complex amplitude at the output rate, for coherent receivers.
+  void ProcessSamples(std::span<const float> input, std::vector<float>* output_samples,
+                      std::vector<std::complex<float>>* block_sums);
 
   // The smoother's group delay at DC, in output samples.
   int delay() const { return delay_; }
   double sample_rate() const { return sample_rate_; }
   double frequency() const { return frequency_; }
+  // Oscillator phase step per input sample, in 2^-32 turns.
+  uint32_t phase_increment() const { return phase_increment_; }
 
  private:
   const float* table_;

@@ -1,6 +1,8 @@
 #include "audio/sorvane/dtmf/tone_strength_filter.h"
 
+#include <algorithm>
 #include <cmath>
+#include <complex>
 #include <numbers>
 #include <vector>
 
@@ -97,6 +99,26 @@ TEST(ToneStrengthFilterDeathTest, RejectsBadDecimationAndNullOutput) {
                sorvel_test::CheckFailed("output_samples"));
 }
 #endif
+
+// Verifies that the raw block sums come one per output, each the unsmoothed
+// complex sum of its block: an on-frequency tone of amplitude A gives
+// magnitude A * D / 2 (within the image at twice the tone) from the first
+// block on, whatever the call sizes.
+TEST(ToneStrengthFilterTest, BlockSumsAreRawBlockIntegrals) {
+  const int decimation = 40;
+  ToneStrengthFilter filter(decimation, 8000.0, 750.0, 10.0);
+  const std::vector<float> x = Tone(750.0, 8000.0, 4000, 2.0);
+  std::vector<float> out;
+  std::vector<std::complex<float>> sums, all;
+  for (size_t start = 0; start < x.size(); start += 333) {
+    const size_t n = std::min<size_t>(333, x.size() - start);
+    filter.ProcessSamples(std::span<const float>(x).subspan(start, n), &out, &sums);
+    EXPECT_EQ(sums.size(), out.size());
+    all.insert(all.end(), sums.begin(), sums.end());
+  }
+  ASSERT_EQ(all.size(), x.size() / decimation);
+  for (const std::complex<float>& z : all) EXPECT_NEAR(std::abs(z), 2.0 * decimation / 2, 1.5);  // the 2f image: about 1
+}
 
 }  // namespace
 }  // namespace audio_sorvane
