@@ -36,6 +36,8 @@ constexpr int kSpreadLags = 128;
 constexpr int kSpreadStride = 4;
 constexpr float kSpreadThreshold = 664.0f;
 constexpr float kLongSpreadThreshold = 1251.0f;
+// Bins per block of the band's whitening.
+constexpr int kWhiteningBlock = 16;
 // Spectral power, relative to the mean over the code's band, above which a
 // bin counts as a tone and is clipped.
 constexpr float kMaxBinPower = 2.0f;
@@ -229,13 +231,36 @@ void HotsoundDetector::ScoreWindow() {
   float scale = 0.0f;
   if (energy >= kSilentPower * kN && peak < kMaxCrest * energy / kN) {
     fft_.Forward(base_re_.data(), base_im_.data(), spec_re_.data(), spec_im_.data());
-    // Bins far above the window's mean power (sustained tones of music, a
+    double band = 0.0;
+    for (int bin : code_bins_) band += spec_re_[bin] * spec_re_[bin] + spec_im_[bin] * spec_im_[bin];
+    const double band_mean = band / code_bins_.size();
+    // First each block of kWhiteningBlock bins is brought to the band's
+    // mean: a microphone's roll-off tilts the band, and music through it
+    // would otherwise correlate with the code into smooth lag profiles.
+    // The outer blocks reach over the bins the carrier offsets read.
+    const int half_band = static_cast<int>(code_bins_.size()) / 2;
+    for (int lo = -half_band; lo < half_band; lo += kWhiteningBlock) {
+      const int first = lo == -half_band ? lo - kDopplerBins / 2 : lo;
+      const int last = lo + kWhiteningBlock >= half_band ? half_band + kDopplerBins / 2
+                                                         : lo + kWhiteningBlock - 1;
+      double power = 0.0;
+      for (int f = first; f <= last; ++f) {
+        const int k = (f + kN) % kN;
+        power += spec_re_[k] * spec_re_[k] + spec_im_[k] * spec_im_[k];
+      }
+      if (power <= 0.0) continue;
+      const float g = static_cast<float>(std::sqrt(band_mean * (last - first + 1) / power));
+      for (int f = first; f <= last; ++f) {
+        const int k = (f + kN) % kN;
+        spec_re_[k] *= g;
+        spec_im_[k] *= g;
+      }
+    }
+    // Then bins far above the band's mean power (sustained tones of music, a
     // whistle) are pulled down to kMaxBinPower times the mean: a few tones
     // correlate with the code into smooth lag profiles that the spread
     // statistic would take for a room. Noise and the code rarely get there.
-    double band = 0.0;
-    for (int bin : code_bins_) band += spec_re_[bin] * spec_re_[bin] + spec_im_[bin] * spec_im_[bin];
-    const float ceiling = static_cast<float>(kMaxBinPower * band / code_bins_.size());
+    const float ceiling = static_cast<float>(kMaxBinPower * band_mean);
     for (int k = 0; k < kN; ++k) {
       const float p = spec_re_[k] * spec_re_[k] + spec_im_[k] * spec_im_[k];
       if (p > ceiling) {
