@@ -125,6 +125,7 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   for (ToneStrengthFilter& filter : tone_strength_filters_) filter.Reset();
   for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Clear();
   for (StreamBuffer& buffer : tone_block_buffers_) buffer.Clear();
+  last_search_end_ = -1;
   tone_scores_.resize(0, 0);
   column_signal_.clear();
   column_noise_.clear();
@@ -449,6 +450,30 @@ void DtmfDecoder::FrameAmplitudes(int first, int count, audio_dsp::ComplexMatrix
   }
 }
 
+bool DtmfDecoder::LoopRepeats(int first, int count) const {
+  const int frame = baseband_frame_size_;
+  const int loop = sequence_search_->params().period;
+  double xy = 0.0, xx = 0.0, yy = 0.0;
+  std::vector<double> x(count);
+  for (int k = 0; k < num_frequencies_; ++k) {
+    const std::span<const float> strengths = tone_strength_buffers_[k].View(0);
+    double mean = 0.0;
+    for (int n = 0; n < count; ++n) {
+      x[n] = strengths[first + n * frame + frame / 2];
+      mean += x[n];
+    }
+    mean /= count;
+    for (int n = 0; n + loop < count; ++n) {
+      const double a = x[n] - mean, b = x[n + loop] - mean;
+      xy += a * b;
+      xx += a * a;
+      yy += b * b;
+    }
+  }
+  return xx > 0.0 && yy > 0.0 &&
+         xy >= params_.room_search.min_loop_correlation * std::sqrt(xx * yy);
+}
+
 bool DtmfDecoder::TokenFromMasks(const std::vector<uint32_t>& tone_masks,
                                  DecodedToken* token) const {
   const int period = sequence_search_->params().period;
@@ -498,6 +523,14 @@ bool DtmfDecoder::GetReverberantToken(DecodeResults* decode_results) {
   const int begin = tone_strength_buffers_[0].num_discarded_samples();
   const int earliest = std::max(0, room.settle_frames * frame - begin);
   const int loop = sequence_search_->params().period;
+  // Once per frame of new audio, and only for audio that repeats.
+  const int64_t end = static_cast<int64_t>(begin) + length;
+  if (last_search_end_ >= 0 && end - last_search_end_ < frame) return false;
+  last_search_end_ = end;
+  {
+    const int count = std::min(std::max(length - earliest, 0) / frame, room.max_frames);
+    if (count < 2 * loop || !LoopRepeats(length - count * frame, count)) return false;
+  }
 
   struct Fit {
     double cost;

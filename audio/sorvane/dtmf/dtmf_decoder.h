@@ -66,6 +66,10 @@ struct RoomSearchParams {
   int timings_searched = 4;
   // Candidates returned, best fit first.
   int max_tokens = 3;
+  // The search runs only when the tone strengths one loop apart correlate
+  // at least this much (a looped broadcast repeats; noise, speech and music
+  // do not), and at most once per frame of new audio.
+  float min_loop_correlation = 0.5f;
 };
 
 // The tone parameters shared with the encoder, then the receiver's own.
@@ -136,6 +140,9 @@ class DtmfDecoder {
   // Matched-filter outputs of `count` frames starting at buffer index
   // `first`, one row per frame, phase-aligned across frames.
   void FrameAmplitudes(int first, int count, audio_dsp::ComplexMatrix* frames) const;
+  // Whether the tone strengths of the newest frames, sampled mid-frame and
+  // centred per tone, correlate with those one loop later.
+  bool LoopRepeats(int first, int count) const;
   // A token read from per-tone loop masks; false unless the loop holds
   // exactly one spacer and valid symbols.
   bool TokenFromMasks(const std::vector<uint32_t>& tone_masks, DecodedToken* token) const;
@@ -169,6 +176,7 @@ class DtmfDecoder {
   std::vector<float> frame_window_;              // per baseband sample of a frame
   std::unordered_map<uint32_t, int> symbol_of_tones_;  // tone bit set -> symbol
   std::unique_ptr<ToneSequenceSearch> sequence_search_;
+  int64_t last_search_end_ = -1;  // stream position of the last gate check
 
   // Per-column results of the last GetToken, for the columns of the buffers
   // as they were then, starting at stream index columns_begin_.

@@ -137,6 +137,11 @@ void ToneSequenceSearch::FitResiduals(const audio_dsp::ComplexMatrix& frames) {
 
 // Dynamic programming over tones; a state counts the tones chosen so far at
 // every position. Only reachable states are visited.
+namespace {
+// Partial assignments kept after each tone.
+constexpr int kBeamStates = 1024;
+}  // namespace
+
 bool ToneSequenceSearch::Combine(std::vector<uint32_t>* tone_masks, double* cost) {
   const int per_tone = params_.masks_per_tone + 1;
   const double inf = std::numeric_limits<double>::infinity();
@@ -179,6 +184,15 @@ bool ToneSequenceSearch::Combine(std::vector<uint32_t>* tone_masks, double* cost
           choice[to] = static_cast<int8_t>(i);
         }
       }
+    }
+    if (static_cast<int>(next_active_.size()) > kBeamStates) {
+      // Only the cheapest partial assignments go on: the full table of
+      // per-position tone counts is large (3^9 for the default loop), and
+      // the right answer fits each present tone far better than the rest.
+      std::nth_element(next_active_.begin(), next_active_.begin() + kBeamStates, next_active_.end(),
+                       [this](int a, int b) { return next_cost_[a] < next_cost_[b]; });
+      for (size_t i = kBeamStates; i < next_active_.size(); ++i) next_cost_[next_active_[i]] = inf;
+      next_active_.resize(kBeamStates);
     }
     for (int s : active_) cost_[s] = inf;
     for (int s : next_active_) cost_[s] = next_cost_[s], next_cost_[s] = inf;
