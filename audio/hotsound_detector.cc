@@ -47,6 +47,11 @@ constexpr float kSilentPower = 1e-3f;
 // Peak over mean baseband power above which a window counts as a click.
 // Noise and broadcasts stay below about 12 (ln 256 plus a few).
 constexpr float kMaxCrest = 20.0f;
+// The carrier offsets searched, in window bins, and the largest whole-bin
+// shift they read from a spectrum (-2.5 reads the half-bin spectrum 3 down).
+constexpr double kOffsetBins[HotsoundDetector::kCarrierOffsets] = {-2.5, -2.0, -1.0, 0.0,
+                                                                   1.0,  2.0,  2.5};
+constexpr int kMaxShift = 3;
 // The code's lag moves against the carrier offset (a faster broadcast
 // reaches each window earlier in its code).
 constexpr double kDriftSign = -1.0;
@@ -130,7 +135,11 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
   }
 
   window_.resize(window_size_);
-  for (auto* v : {&base_re_, &base_im_, &spec_re_, &spec_im_}) v->resize(kN);
+  for (auto* v : {&base_re_, &base_im_, &spec_re_, &spec_im_, &half_re_, &half_im_}) v->resize(kN);
+  for (int m = 0; m < kN; ++m) {
+    half_turn_re_.push_back(static_cast<float>(std::cos(std::numbers::pi * m / kN)));
+    half_turn_im_.push_back(static_cast<float>(-std::sin(std::numbers::pi * m / kN)));
+  }
   prod_re_.assign(kN, 0.0f);
   prod_im_.assign(kN, 0.0f);
   // A phone moving at v compresses the broadcast by v / c: the code's lag
@@ -147,15 +156,15 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
   families_[1].long_threshold = kLongSpreadThreshold;
   for (Family& f : families_) {
     f.row = f.lags + 2 * kPad;
-    for (int d = 0; d < kDopplerBins; ++d) {
-      const double compression = (d - kDopplerBins / 2) * window_rate / config_.frequency;
+    for (int d = 0; d < kCarrierOffsets; ++d) {
+      const double compression = kOffsetBins[d] * window_rate / config_.frequency;
       f.drift.push_back(
           static_cast<int>(std::lround(kDriftSign * compression * kHopFrames * kN / f.stride)));
       CHECK(std::abs(f.drift.back()) + 1 <= kPad);
     }
-    f.ring.assign(kLongWindows, std::vector<float>(kDopplerBins * f.lags, 0.0f));
-    f.short_tracks.assign(kLongWindows, std::vector<float>(kDopplerBins * f.row, 0.0f));
-    f.long_track.assign(kDopplerBins * f.row, 0.0f);
+    f.ring.assign(kLongWindows, std::vector<float>(kCarrierOffsets * f.lags, 0.0f));
+    f.short_tracks.assign(kLongWindows, std::vector<float>(kCarrierOffsets * f.row, 0.0f));
+    f.long_track.assign(kCarrierOffsets * f.row, 0.0f);
   }
   scales_.assign(kLongWindows, 0.0f);
   powers_.resize(kN);
@@ -231,53 +240,27 @@ void HotsoundDetector::ScoreWindow() {
   float scale = 0.0f;
   if (energy >= kSilentPower * kN && peak < kMaxCrest * energy / kN) {
     fft_.Forward(base_re_.data(), base_im_.data(), spec_re_.data(), spec_im_.data());
-    double band = 0.0;
-    for (int bin : code_bins_) band += spec_re_[bin] * spec_re_[bin] + spec_im_[bin] * spec_im_[bin];
-    const double band_mean = band / code_bins_.size();
-    // First each block of kWhiteningBlock bins is brought to the band's
-    // mean: a microphone's roll-off tilts the band, and music through it
-    // would otherwise correlate with the code into smooth lag profiles.
-    // The outer blocks reach over the bins the carrier offsets read.
-    const int half_band = static_cast<int>(code_bins_.size()) / 2;
-    for (int lo = -half_band; lo < half_band; lo += kWhiteningBlock) {
-      const int first = lo == -half_band ? lo - kDopplerBins / 2 : lo;
-      const int last = lo + kWhiteningBlock >= half_band ? half_band + kDopplerBins / 2
-                                                         : lo + kWhiteningBlock - 1;
-      double power = 0.0;
-      for (int f = first; f <= last; ++f) {
-        const int k = (f + kN) % kN;
-        power += spec_re_[k] * spec_re_[k] + spec_im_[k] * spec_im_[k];
-      }
-      if (power <= 0.0) continue;
-      const float g = static_cast<float>(std::sqrt(band_mean * (last - first + 1) / power));
-      for (int f = first; f <= last; ++f) {
-        const int k = (f + kN) % kN;
-        spec_re_[k] *= g;
-        spec_im_[k] *= g;
-      }
+    // The same window half a bin lower, so its spectrum reads half a bin up.
+    for (int m = 0; m < kN; ++m) {
+      const float re = base_re_[m], im = base_im_[m];
+      base_re_[m] = re * half_turn_re_[m] - im * half_turn_im_[m];
+      base_im_[m] = re * half_turn_im_[m] + im * half_turn_re_[m];
     }
-    // Then bins far above the band's mean power (sustained tones of music, a
-    // whistle) are pulled down to kMaxBinPower times the mean: a few tones
-    // correlate with the code into smooth lag profiles that the spread
-    // statistic would take for a room. Noise and the code rarely get there.
-    const float ceiling = static_cast<float>(kMaxBinPower * band_mean);
-    for (int k = 0; k < kN; ++k) {
-      const float p = spec_re_[k] * spec_re_[k] + spec_im_[k] * spec_im_[k];
-      if (p > ceiling) {
-        const float g = std::sqrt(ceiling / p);
-        spec_re_[k] *= g;
-        spec_im_[k] *= g;
-      }
-    }
+    fft_.Forward(base_re_.data(), base_im_.data(), half_re_.data(), half_im_.data());
+    Condition(spec_re_.data(), spec_im_.data());
+    Condition(half_re_.data(), half_im_.data());
     // Correlation powers per offset; their total from the products (the
     // inverse transform is unnormalised: sum |c|^2 = kN sum |product|^2).
     double total = 0.0;
-    for (int d = 0; d < kDopplerBins; ++d) {
-      const int shift = d - kDopplerBins / 2;
+    for (int d = 0; d < kCarrierOffsets; ++d) {
+      const int shift = static_cast<int>(std::floor(kOffsetBins[d]));
+      const bool half = kOffsetBins[d] != shift;
+      const float* x_re = half ? half_re_.data() : spec_re_.data();
+      const float* x_im = half ? half_im_.data() : spec_im_.data();
       for (int bin : code_bins_) {
         const int from = (bin + shift + kN) % kN;
-        const float re = spec_re_[from] * code_re_[bin] - spec_im_[from] * code_im_[bin];
-        const float im = spec_re_[from] * code_im_[bin] + spec_im_[from] * code_re_[bin];
+        const float re = x_re[from] * code_re_[bin] - x_im[from] * code_im_[bin];
+        const float im = x_re[from] * code_im_[bin] + x_im[from] * code_re_[bin];
         prod_re_[bin] = re;
         prod_im_[bin] = im;
         total += re * re + im * im;
@@ -297,61 +280,105 @@ void HotsoundDetector::ScoreWindow() {
         const float* p = powers + j * kSpreadStride;
         pooled_[j] = (p[0] + p[1]) + (p[2] + p[3]);
       }
+      constexpr int kGroups = kSpreadLags / kSpreadStride;
+      std::copy(pooled_.begin(), pooled_.begin() + kGroups, pooled_.begin() + spread.lags);  // cyclic
       float sum = 0.0f;
-      for (int j = 0; j < kSpreadLags / kSpreadStride; ++j) sum += pooled_[j];
+      for (int j = 0; j < kGroups; ++j) sum += pooled_[j];
       for (int j = 0; j < spread.lags; ++j) {
         out[j] = sum;
-        sum += pooled_[(j + kSpreadLags / kSpreadStride) % spread.lags] - pooled_[j];
+        sum += pooled_[j + kGroups] - pooled_[j];
       }
     }
-    scale = static_cast<float>(kDopplerBins / total);
+    scale = static_cast<float>(kCarrierOffsets / total);
   }
   scales_[slot] = scale;
 
   float best = 0.0f;
-  for (Family& f : families_) best = std::max(best, UpdateTracks(f, slot));
+  const bool update_long = windows_++ % 2 == 0;
+  for (Family& f : families_) best = std::max(best, UpdateTracks(f, slot, update_long));
   score_ = kThreshold * best;
 }
 
-float HotsoundDetector::UpdateTracks(Family& f, int newest) {
+void HotsoundDetector::Condition(float* spec_re, float* spec_im) const {
+  // Bins -reach .. reach around the carrier, the only ones read; negative
+  // frequencies sit at the end of the arrays.
+  const int half_band = static_cast<int>(code_bins_.size()) / 2;
+  const int reach = half_band + kMaxShift;
+  float power[2 * (kN / 2)];
+  const auto index = [](int f) { return f < 0 ? f + kN : f; };
+  double band = 0.0;
+  for (int f = -reach; f <= reach; ++f) {
+    const int k = index(f);
+    power[f + reach] = spec_re[k] * spec_re[k] + spec_im[k] * spec_im[k];
+    if (f >= -half_band && f <= half_band) band += power[f + reach];
+  }
+  const float band_mean = static_cast<float>(band / code_bins_.size());
+  // Each block of kWhiteningBlock bins is brought to the band's mean (a
+  // microphone's roll-off tilts the band, and music through it would
+  // otherwise correlate with the code into smooth lag profiles; the outer
+  // blocks reach over the bins the carrier offsets read); then bins far
+  // above the mean (sustained tones of music, a whistle) are pulled down to
+  // kMaxBinPower times it: a few tones correlate with the code into smooth
+  // lag profiles that the spread statistic would take for a room. Noise and
+  // the code rarely get there.
+  const float ceiling = kMaxBinPower * band_mean;
+  for (int lo = -half_band; lo < half_band; lo += kWhiteningBlock) {
+    const int first = lo == -half_band ? -reach : lo;
+    const int last = lo + kWhiteningBlock >= half_band ? reach : lo + kWhiteningBlock - 1;
+    float block = 0.0f;
+    for (int f = first; f <= last; ++f) block += power[f + reach];
+    if (!(block > 0.0f)) continue;
+    const float gain = band_mean * static_cast<float>(last - first + 1) / block;  // of power
+    for (int f = first; f <= last; ++f) {
+      const float p = power[f + reach] * gain;
+      const float g = p > ceiling ? std::sqrt(gain * ceiling / p) : std::sqrt(gain);
+      const int k = index(f);
+      spec_re[k] *= g;
+      spec_im[k] *= g;
+    }
+  }
+}
+
+float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
   // The short track over the last kWindows windows; the long one extends
-  // the short track that ended kWindows windows ago by the same windows.
+  // the short track that ended kWindows windows ago by the same windows
+  // (on every other window: it is for broadcasts that take a second).
   const int first = (newest + kLongWindows - kWindows + 1) % kLongWindows;
   float* short_track = f.short_tracks[newest].data();
   float* long_track = f.long_track.data();
-  for (int d = 0; d < kDopplerBins; ++d) {
+  for (int d = 0; d < kCarrierOffsets; ++d) {
     const float* e = f.ring[first].data() + d * f.lags;
     const float scale = scales_[first];
     std::transform(e, e + f.lags, short_track + d * f.row + kPad, [=](float p) { return p * scale; });
+    if (!update_long) continue;
     const float* older = f.short_tracks[(first + kLongWindows - 1) % kLongWindows].data() + d * f.row;
     std::copy(older, older + f.row, long_track + d * f.row);
     ExtendTrack(f, long_track + d * f.row, e, scale, f.drift[d]);
   }
   for (int k = 1; k < kWindows; ++k) {
     const int slot = (first + k) % kLongWindows;
-    for (int d = 0; d < kDopplerBins; ++d) {
+    for (int d = 0; d < kCarrierOffsets; ++d) {
       const float* e = f.ring[slot].data() + d * f.lags;
       ExtendTrack(f, short_track + d * f.row, e, scales_[slot], f.drift[d]);
-      ExtendTrack(f, long_track + d * f.row, e, scales_[slot], f.drift[d]);
+      if (update_long) ExtendTrack(f, long_track + d * f.row, e, scales_[slot], f.drift[d]);
     }
   }
-  using audio_dsp::Float4;
-  Float4 short_max = {}, long_max = {};
-  for (int d = 0; d < kDopplerBins; ++d) {
-    const float* a = short_track + d * f.row + kPad;
-    const float* b = long_track + d * f.row + kPad;
-    for (int t = 0; t < f.lags; t += 4) {
-      short_max = Max(short_max, audio_dsp::Load4(a + t));
-      long_max = Max(long_max, audio_dsp::Load4(b + t));
-    }
-  }
-  const float raw_short = std::max(std::max(short_max[0], short_max[1]), std::max(short_max[2], short_max[3]));
-  const float raw_long = std::max(std::max(long_max[0], long_max[1]), std::max(long_max[2], long_max[3]));
-  // Noise sums to f.pool per window on average; relative to what the
-  // thresholds add to that, so a score near 0 means noise for either family.
+  // Noise sums to f.pool per window on average; scores count from there,
+  // relative to the thresholds, so a score near 0 means noise for either
+  // family.
   const float mean = static_cast<float>(f.pool);
-  return std::max((raw_short - kWindows * mean) / (f.threshold - kWindows * mean),
-                  (raw_long - kLongWindows * mean) / (f.long_threshold - kLongWindows * mean));
+  const auto best = [&](const float* track) {
+    audio_dsp::Float4 top = {};
+    for (int d = 0; d < kCarrierOffsets; ++d) {
+      const float* a = track + d * f.row + kPad;
+      for (int t = 0; t < f.lags; t += 4) top = Max(top, audio_dsp::Load4(a + t));
+    }
+    return std::max(std::max(top[0], top[1]), std::max(top[2], top[3]));
+  };
+  if (update_long) {
+    f.long_score = (best(long_track) - kLongWindows * mean) / (f.long_threshold - kLongWindows * mean);
+  }
+  return std::max((best(short_track) - kWindows * mean) / (f.threshold - kWindows * mean), f.long_score);
 }
 
 void HotsoundDetector::ExtendTrack(const Family& f, float* row, const float* powers, float scale,

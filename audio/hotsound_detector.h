@@ -5,20 +5,22 @@
 // the carrier, so the broadcast is periodic in the frame length whatever the
 // symbols. Every kHopFrames frames the detector takes one frame's worth of
 // audio ("window"), mixes it down from the carrier and low-passes it into
-// kBasebandSize complex samples (two per chip), and correlates that with
-// the code at every cyclic lag (half-chip steps) for kDopplerBins carrier
-// offsets one window-bin (23 Hz) apart, through one forward and
-// kDopplerBins inverse FFTs. Each window's correlation powers are divided by
-// their mean, so the statistic does not depend on the level or the spectral
-// tilt of the audio: noise, speech, music, tones and clicks spread evenly
-// over the lags, the code piles up at one, or in a room over the few
-// milliseconds of its early reflections. A score adds windows along a lag
-// track (each step may move one lag around the drift that the carrier
-// offset implies, which follows a moving phone) and takes the best track
-// and offset, for two statistics (single lags, and the sum over 5.4 ms of
+// kBasebandSize complex samples (two per chip), whitens the code band (so
+// a microphone's roll-off or the tilt of music does not matter) and clips
+// tones, and correlates it with the code at every cyclic lag (half-chip
+// steps) for kCarrierOffsets carrier offsets, through two forward (whole and
+// half-bin offsets) and kCarrierOffsets inverse FFTs. Each window's
+// correlation powers are divided by their mean, so the statistic does not
+// depend on the level of the audio: noise, speech, music and clicks spread
+// evenly over the lags, the code piles up at one, or in a room over the
+// milliseconds of its reflections. A score adds windows along a lag track
+// (each step may move one lag around the drift that the carrier offset
+// implies, which follows a moving phone) and takes the best track and
+// offset, for two statistics (single lags, and sums over half a frame of
 // lags) and two lengths: the last kWindows windows (about 0.5 s, for a
-// quick wake) and the last kLongWindows (about 1 s, for weak broadcasts),
-// each against its own threshold; 25.0 means a broadcast.
+// quick wake) and the last kLongWindows (about 1 s, for weak broadcasts;
+// updated every other window), each against its own threshold; 25.0 means
+// a broadcast.
 //
 // Scores depend only on the audio of the last kLongWindows windows, not on
 // how it was split into blocks. Not thread safe.
@@ -57,7 +59,9 @@ class HotsoundDetector {
   // code's main band (half the chip rate), the symbol tones and Doppler.
   static constexpr double kHalfBandwidth = 2000.0;
   static constexpr int kBasebandSize = 256;  // complex samples per window
-  static constexpr int kDopplerBins = 5;
+  // Carrier offsets searched, in window bins (23 Hz): 0, +-1, +-2 and
+  // +-2.5 (a phone moving at 1 m/s shifts the carrier by 2.3 bins).
+  static constexpr int kCarrierOffsets = 7;
   static constexpr int kHopFrames = 3;  // frames from one window to the next
   static constexpr int kWindows = 4;    // windows a score adds up
   static constexpr int kLongWindows = 8;  // ... and the slower, finer one
@@ -90,18 +94,22 @@ class HotsoundDetector {
     float threshold = 0.0f, long_threshold = 0.0f;  // raw track sums that score 1
     int row = 0;     // lags + cyclic padding
     std::vector<int> drift;  // per carrier offset: statistics the code moves per window
-    // The last kLongWindows windows' statistics, kDopplerBins x lags each.
+    // The last kLongWindows windows' statistics, kCarrierOffsets x lags each.
     std::vector<std::vector<float>> ring;
-    // Per window slot, the short track that ended there; the long track.
+    // Per window slot, the short track that ended there; the long track,
+    // and its best sum relative to its threshold when last updated.
     std::vector<std::vector<float>> short_tracks;
     std::vector<float> long_track;
+    float long_score = 0.0f;
   };
 
   void ScoreWindow();
+  // Whitens the code band of a spectrum and clips its tones.
+  void Condition(float* re, float* im) const;
   // Adds the window in `newest` to the family's tracks; returns the higher
   // of its short and long track sums' excess over noise, each relative to
   // its threshold's (1: on the air).
-  float UpdateTracks(Family& f, int newest);
+  float UpdateTracks(Family& f, int newest, bool update_long);
   void ExtendTrack(const Family& f, float* row, const float* powers, float scale, int drift);
 
   HotsoundDetectorConfig config_;
@@ -122,9 +130,11 @@ class HotsoundDetector {
   std::vector<float> window_;  // the current window's input so far
   int fill_ = 0;
   int skip_ = 0;               // input samples to drop before the next window
-  // The window mixed down (and, once correlated, its lags); its spectrum;
-  // the spectrum times the code's.
-  std::vector<float> base_re_, base_im_, spec_re_, spec_im_, prod_re_, prod_im_;
+  // The window mixed down (and, once correlated, its lags); its spectrum and
+  // the spectrum half a bin up; a spectrum times the code's.
+  std::vector<float> base_re_, base_im_, spec_re_, spec_im_, half_re_, half_im_, prod_re_, prod_im_;
+  std::vector<float> half_turn_re_, half_turn_im_;  // exp(-i pi m / kBasebandSize)
+  int windows_ = 0;  // windows scored, for the long tracks' every other window
   Family families_[2];
   std::vector<float> scales_;  // per window slot: 1 / mean power, 0 if silent
   int ring_next_ = 0;          // the slot the next window goes to
