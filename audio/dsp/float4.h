@@ -23,6 +23,18 @@ inline Float4 Splat4(float x) { return Float4{x, x, x, x}; }
 
 inline float Sum4(Float4 v) { return (v[0] + v[1]) + (v[2] + v[3]); }
 
+// Transposes the 4 x 4 matrix whose rows are a, b, c, d.
+inline void Transpose4(Float4& a, Float4& b, Float4& c, Float4& d) {
+  const Float4 t0 = __builtin_shufflevector(a, b, 0, 4, 1, 5);
+  const Float4 t1 = __builtin_shufflevector(c, d, 0, 4, 1, 5);
+  const Float4 t2 = __builtin_shufflevector(a, b, 2, 6, 3, 7);
+  const Float4 t3 = __builtin_shufflevector(c, d, 2, 6, 3, 7);
+  a = __builtin_shufflevector(t0, t1, 0, 1, 4, 5);
+  b = __builtin_shufflevector(t0, t1, 2, 3, 6, 7);
+  c = __builtin_shufflevector(t2, t3, 0, 1, 4, 5);
+  d = __builtin_shufflevector(t2, t3, 2, 3, 6, 7);
+}
+
 }  // namespace audio_dsp
 
 #endif  // AUDIO_DSP_FLOAT4_H_

@@ -78,13 +78,12 @@ void Radix4Fft::Forward(const float* re, const float* im, float* out_re, float* 
     Complex4 a0 = Load(re, im, j), a1 = Load(re, im, j + quarter);
     Complex4 a2 = Load(re, im, j + 2 * quarter), a3 = Load(re, im, j + 3 * quarter);
     Butterfly(a0, a1, a2, a3);
-    const Complex4* y[4] = {&a0, &a1, &a2, &a3};
-    for (int lane = 0; lane < 4; ++lane) {
-      for (int r = 0; r < 4; ++r) {
-        dst_re[4 * (j + lane) + r] = y[r]->re[lane];
-        dst_im[4 * (j + lane) + r] = y[r]->im[lane];
-      }
-    }
+    Transpose4(a0.re, a1.re, a2.re, a3.re);
+    Transpose4(a0.im, a1.im, a2.im, a3.im);
+    Store(dst_re, dst_im, 4 * j, a0);
+    Store(dst_re, dst_im, 4 * j + 4, a1);
+    Store(dst_re, dst_im, 4 * j + 8, a2);
+    Store(dst_re, dst_im, 4 * j + 12, a3);
   }
   const float* src_re = dst_re;
   const float* src_im = dst_im;
