@@ -1,6 +1,7 @@
-// The DSSS and multi-tone links through the physical room model: the receiver facade as an
-// app builds it (plain and behind hotsound), a random message looped from a
-// random point, fed in 10 ms blocks, the first token it returns judged.
+// The DSSS and multi-tone links through the physical room model: the
+// receiver facade as an app builds it (DSSS plain and behind hotsound), a
+// random message looped from a random point, fed in 10 ms blocks, the first
+// token it returns judged.
 #include <string>
 
 #include "gtest/gtest.h"
@@ -18,6 +19,21 @@ constexpr Room kRooms[] = {{"office", 4.0, 3.0, 2.5, 0.4},
                            {"living room", 6.0, 5.0, 2.7, 0.6},
                            {"hall", 10.0, 8.0, 3.5, 1.0}};
 
+// One trial of `scheme` in `room` at `distance` m: 3 s of audio at +10 dB
+// white noise, an omni source, the phones' loudspeaker and microphone on.
+TrialResult RoomTrial(const Room& room, double distance, const char* scheme, uint64_t seed) {
+  LinkSetup setup;
+  setup.scheme = scheme;
+  setup.seconds = 3.0;
+  setup.channel.room = {.width = room.width,
+                        .depth = room.depth,
+                        .height = room.height,
+                        .rt60 = room.rt60,
+                        .distance = distance};
+  EXPECT_EQ(CheckRoom(setup.channel.room), "");
+  return RunTrial(setup, 10.0, seed);
+}
+
 // Verifies that a token gets through each room at 3 and 5 m, where most of
 // the energy arrives after the direct path, within 3 s at +10 dB white
 // noise, for the plain DSSS decoder and the one behind hotsound (an omni
@@ -27,17 +43,7 @@ TEST(RoomEndToEndTest, DecodesInReverberantRooms) {
   for (const Room& room : kRooms) {
     for (double distance : {3.0, 5.0}) {
       for (const char* scheme : {"dsss", "hotsound"}) {
-        LinkSetup setup;
-        setup.scheme = scheme;
-        setup.seconds = 3.0;
-        RoomConfig& config = setup.channel.room;
-        config.width = room.width;
-        config.depth = room.depth;
-        config.height = room.height;
-        config.rt60 = room.rt60;
-        config.distance = distance;
-        ASSERT_EQ(CheckRoom(setup.channel.room), "");
-        const TrialResult result = RunTrial(setup, 10.0, seed++);
+        const TrialResult result = RoomTrial(room, distance, scheme, seed++);
         EXPECT_TRUE(result.success)
             << scheme << " in the " << room.name << " at " << distance << " m"
             << (result.wrong_token ? ": wrong token" : ": no token");
@@ -57,17 +63,7 @@ TEST(RoomEndToEndTest, MultiToneDecodesInReverberantRooms) {
   uint64_t seed = 80;
   for (const Room& room : kRooms) {
     for (double distance : {1.0, 2.0}) {
-      LinkSetup setup;
-      setup.scheme = "dtmf";
-      setup.seconds = 3.0;
-      RoomConfig& config = setup.channel.room;
-      config.width = room.width;
-      config.depth = room.depth;
-      config.height = room.height;
-      config.rt60 = room.rt60;
-      config.distance = distance;
-      ASSERT_EQ(CheckRoom(setup.channel.room), "");
-      const TrialResult result = RunTrial(setup, 10.0, seed++);
+      const TrialResult result = RoomTrial(room, distance, "dtmf", seed++);
       EXPECT_TRUE(result.success) << "the " << room.name << " at " << distance << " m"
                                   << (result.wrong_token ? ": wrong token" : ": no token");
     }
