@@ -134,7 +134,7 @@ class HotsoundDetector {
   // the spectrum half a bin up; a spectrum times the code's.
   std::vector<float> base_re_, base_im_, spec_re_, spec_im_, half_re_, half_im_, prod_re_, prod_im_;
   std::vector<float> half_turn_re_, half_turn_im_;  // exp(-i pi m / kBasebandSize)
-  int windows_ = 0;  // windows scored, for the long tracks' every other window
+  uint32_t windows_ = 0;  // windows scored (wraps harmlessly), for the long tracks' every other window
   Family families_[2];
   std::vector<float> scales_;  // per window slot: 1 / mean power, 0 if silent
   int ring_next_ = 0;          // the slot the next window goes to

@@ -160,6 +160,54 @@ TEST(DsssEndToEndTest, OverlongInputAndBoundedBuffers) {
   EXPECT_GT(largest, 14700 * 2);
 }
 
+// Days of listening move every stream position past 2^31 and 2^32 baseband
+// samples. A decoder started just below each boundary, fed audio that crosses
+// it while the buffers discard, must hear what a fresh decoder hears at the
+// same times.
+TEST(DsssEndToEndTest, StreamPositionsCrossThe32BitBoundaries) {
+  const Link link;
+  std::vector<float> signal(2 * 44100, 0.0f);  // the broadcast starts at 2 s
+  const std::vector<float> broadcast = link.Received(5.0, {.snr_db = 5.0});
+  signal.insert(signal.end(), broadcast.begin(), broadcast.end());
+  const int64_t lead = 3 * 14700;  // the boundary falls 3 s in, mid-broadcast
+  struct Heard {
+    Bytes bytes;
+    int position = -1;
+    std::vector<double> times;  // relative to the origin, s
+    int64_t frames = 0;  // scored since the origin
+  };
+  const auto listen = [&](int64_t origin) {
+    auto decoder = link.MakeDecoder(1, 44100.0f);
+    decoder->SetStreamOrigin(origin);
+    DecodeResults results;
+    Heard heard;
+    for (size_t start = 0; start + 441 <= signal.size(); start += 441) {
+      decoder->ProcessSamples(std::span<const float>(signal).subspan(start, 441));
+      if ((start / 441) % 25 == 24 && decoder->GetToken(&results)) {
+        heard.bytes = results.tokens[0].bytes;
+        heard.position = results.tokens[0].position;
+        heard.times.clear();
+        for (float t : results.detection_times) heard.times.push_back(t - origin / 14700.0);
+      }
+    }
+    heard.frames = decoder->acquisition_scorer().frame_counter() - origin;
+    return heard;
+  };
+  const Heard fresh = listen(0);
+  ASSERT_EQ(fresh.bytes, link.token);
+  for (int64_t boundary : {int64_t{1} << 31, int64_t{1} << 32}) {
+    SCOPED_TRACE(boundary);
+    const Heard late = listen(boundary - lead);
+    EXPECT_EQ(late.bytes, fresh.bytes);
+    EXPECT_EQ(late.position, fresh.position);
+    EXPECT_EQ(late.frames, fresh.frames);
+    ASSERT_EQ(late.times.size(), fresh.times.size());
+    // Detection times are floats in seconds: 2^32 / 14700 s is ~3e5 s,
+    // where a float resolves 1/32 s.
+    for (size_t i = 0; i < late.times.size(); ++i) EXPECT_NEAR(late.times[i], fresh.times[i], 0.05);
+  }
+}
+
 TEST(DsssEndToEndTest, CallsBeforeInitializeAreLoggedErrors) {
   SorvaneDecoder decoder(std::make_shared<const SymbolWaveCoder>(SymbolWaveCoderParams()), {});
   sorvel_test::ScopedLogCapture capture;

@@ -223,8 +223,8 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
   Reset();
 }
 
-void AcquisitionScorer::Reset() {
-  frame_counter_ = 0;
+void AcquisitionScorer::Reset(int64_t first_frame) {
+  frame_counter_ = first_frame_ = first_frame;
   real_window_.Clear();
   imaginary_window_.Clear();
   power_history_.Fill(FloatVector::Zero(num_frequencies_));
@@ -266,14 +266,14 @@ void AcquisitionScorer::ScoreSamples(std::span<const float> baseband_real_signal
                          batch_powers_.data());
         for (int j = 0; j < 8; ++j) {
           const float score = FinishFrame(batch_powers_.data() + j, 8);
-          if (frame_counter_ > noise_delay_) acquisition_scores->push_back(score);
+          if (frame_counter_ - first_frame_ > noise_delay_) acquisition_scores->push_back(score);
           real_window_.Advance();
           imaginary_window_.Advance();
         }
         continue;
       }
       const float score = ScoreFrame(real_window_.Frame(), imaginary_window_.Frame());
-      if (frame_counter_ > noise_delay_) acquisition_scores->push_back(score);
+      if (frame_counter_ - first_frame_ > noise_delay_) acquisition_scores->push_back(score);
       real_window_.Advance();
       imaginary_window_.Advance();
     }
@@ -294,7 +294,8 @@ float AcquisitionScorer::ScoreFrame(std::span<const float> baseband_frame_real,
 }
 
 float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
-  const int n = frame_counter_;
+  const int64_t n = frame_counter_;
+  const int64_t age = n - first_frame_;
   float* power = power_history_[n].data();
   float power_sum = 0.0f;
   for (int i = 0; i < num_frequencies_; ++i) {
@@ -303,17 +304,17 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
   }
 
   float score = 0.0f;
-  if (n == warmup_frames_ - 1) {
+  if (age == warmup_frames_ - 1) {
     float sum = 0.0f;
-    for (int k = 0; k < warmup_frames_; ++k) sum += power_history_[k].sum();
+    for (int k = 0; k < warmup_frames_; ++k) sum += power_history_[first_frame_ + k].sum();
     noise_level_1_ = noise_level_2_ =
         sum / static_cast<float>(num_frequencies_ * warmup_frames_);
-  } else if (n > warmup_frames_ - 1) {
+  } else if (age > warmup_frames_ - 1) {
     const float x = power_sum / static_cast<float>(num_frequencies_);
     noise_level_1_ += noise_alpha_ * (x - noise_level_1_);
     noise_level_2_ += noise_alpha_ * (noise_level_1_ - noise_level_2_);
   }
-  if (n >= warmup_frames_ - 1) {
+  if (age >= warmup_frames_ - 1) {
     const float* delayed = power_history_[n - noise_delay_].data();
     const float peak = *std::max_element(delayed, delayed + num_frequencies_);
     score = peak / (noise_level_2_ + 1e-12f);
@@ -323,7 +324,7 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
 }
 
 float AcquisitionScorer::DetectionScore(bool normalize) const {
-  if (frame_size_ + frame_counter_ <= detection_window_size_) return 0.0f;
+  if (frame_size_ + (frame_counter_ - first_frame_) <= detection_window_size_) return 0.0f;
   FloatVector accumulated(num_frequencies_);
   float peak = 0.0f;
   double total = 0.0;

@@ -16,6 +16,7 @@
 #ifndef AUDIO_SORVANE_ACQUISITION_SCORER_H_
 #define AUDIO_SORVANE_ACQUISITION_SCORER_H_
 
+#include <cstdint>
 #include <span>
 #include <vector>
 
@@ -45,15 +46,17 @@ class AcquisitionScorer {
   float DetectionScore(bool normalize) const;
 
   // Starts over: no frames, empty windows, zero history. The noise levels
-  // are re-seeded after the next warm-up.
-  void Reset();
+  // are re-seeded after the next warm-up. The next frame is numbered
+  // `first_frame` (a test may start far along the stream).
+  void Reset(int64_t first_frame = 0);
   // Zeroes the window samples and the history, keeping positions and count.
   void ZeroHistory();
 
   int frame_size() const { return frame_size_; }
   int noise_delay() const { return noise_delay_; }
   float noise_alpha() const { return noise_alpha_; }
-  int frame_counter() const { return frame_counter_; }
+  // The number of the next frame: frames scored since Reset plus its first_frame.
+  int64_t frame_counter() const { return frame_counter_; }
   int detection_window_size() const { return detection_window_size_; }
   int history_size() const { return power_history_.size(); }
 
@@ -96,7 +99,8 @@ class AcquisitionScorer {
   // The code template; chunk c is code_[c * chunk_size_ ...].
   std::vector<float> code_;
   audio_dsp::ComplexMatrix phasor_matrix_;
-  int frame_counter_ = 0;
+  int64_t frame_counter_ = 0;  // 64-bit: a 32-bit count wraps after 40 h
+  int64_t first_frame_ = 0;
   FrameWindow real_window_;
   FrameWindow imaginary_window_;
   // The chunk correlations and the phasor matrix split into real and

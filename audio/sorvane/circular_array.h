@@ -1,5 +1,5 @@
 // A ring of a power-of-two number of slots addressed by an ever-growing
-// frame counter: counter i (negative ones too) maps to slot i & (size - 1),
+// (64-bit) frame counter: counter i (negative ones too) maps to slot i & (size - 1),
 // so the owner never reduces its counter and no division is needed.
 //
 // Not thread safe. A minimum size outside [1, 2^30] ends the process through
@@ -8,6 +8,7 @@
 #define AUDIO_SORVANE_CIRCULAR_ARRAY_H_
 
 #include <bit>
+#include <cstdint>
 #include <vector>
 
 #include "base/logging.h"
@@ -26,8 +27,10 @@ class CircularArray {
     slots_.resize(size_);
   }
 
-  T& operator[](int counter) { return slots_[counter & mask_]; }
-  const T& operator[](int counter) const { return slots_[counter & mask_]; }
+  T& operator[](int64_t counter) { return slots_[static_cast<size_t>(counter & mask_)]; }
+  const T& operator[](int64_t counter) const {
+    return slots_[static_cast<size_t>(counter & mask_)];
+  }
 
   // Assigns a copy of `value` to every slot.
   void Fill(const T& value) { slots_.assign(size_, value); }
@@ -36,7 +39,7 @@ class CircularArray {
 
  private:
   int size_ = 0;
-  int mask_ = 0;
+  int64_t mask_ = 0;
   std::vector<T> slots_;
 };
 

@@ -126,6 +126,15 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
   initialized_ = true;
 }
 
+void SorvaneDecoder::SetStreamOrigin(int64_t baseband_index) {
+  CHECK(initialized_);
+  CHECK(baseband_real_.size() == 0);
+  baseband_real_.Clear(baseband_index);
+  baseband_imaginary_.Clear(baseband_index);
+  acquisition_scores_.Clear(baseband_index);
+  scorer_->Reset(baseband_index);
+}
+
 void SorvaneDecoder::ResetStream() {
   received_samples_.Zero();
   baseband_real_.Zero();
@@ -172,7 +181,7 @@ void SorvaneDecoder::ProcessSamples(std::span<const float> received_samples) {
     baseband_real_.Discard(d);
     baseband_imaginary_.Discard(d);
     acquisition_scores_.Discard(d);
-    const int first_kept = extension_ + baseband_real_.num_discarded_samples();
+    const int64_t first_kept = extension_ + baseband_real_.num_discarded_samples();
     symbol_score_cache_.erase(symbol_score_cache_.begin(),
                               symbol_score_cache_.lower_bound(first_kept));
   }
@@ -286,17 +295,20 @@ bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
   }
   if (chosen == nullptr) return false;
 
-  const int discarded = baseband_real_.num_discarded_samples();
+  const int64_t discarded = baseband_real_.num_discarded_samples();
+  const auto seconds = [&](int t) {
+    return static_cast<float>(static_cast<double>(discarded + t) / baseband_rate_);
+  };
   if (multipath_ != nullptr) {
     for (int t : chosen->times()) {
-      decode_results->detection_times.push_back((discarded + t) / baseband_rate_);
+      decode_results->detection_times.push_back(seconds(t));
       decode_results->detection_scores.push_back(filtered[t]);
     }
     ScoreGroupOverMultipath(*chosen, filtered, &decode_results->symbol_scores);
   }
   FloatVector scores;
   for (int t : multipath_ != nullptr ? std::vector<int>() : chosen->times()) {
-    decode_results->detection_times.push_back((discarded + t) / baseband_rate_);
+    decode_results->detection_times.push_back(seconds(t));
     decode_results->detection_scores.push_back(filtered[t]);
     if (!ComputeSymbolScores(RefinePeak(t), &scores)) continue;
     const int slot = chosen->SlotOf(t);
@@ -397,7 +409,7 @@ int SorvaneDecoder::RefinePeak(int t) const {
 bool SorvaneDecoder::ComputeSymbolScores(int t, FloatVector* symbol_scores) {
   const int start = t - extension_;
   if (start < 0 || start + extended_size_ > baseband_real_.size()) return false;
-  const int absolute = baseband_real_.num_discarded_samples() + t;
+  const int64_t absolute = baseband_real_.num_discarded_samples() + t;
   if (auto cached = symbol_score_cache_.find(absolute); cached != symbol_score_cache_.end()) {
     *symbol_scores = cached->second;
     return true;

@@ -108,6 +108,10 @@ class SorvaneDecoder {
   bool GetToken(DecodeResults* decode_results);
   // Drops all buffered audio and state (same channels and rate).
   void WipeInternalData();
+  // Numbers the next baseband sample `baseband_index` instead of 0, as if
+  // that much audio had streamed by. Only right after Initialize; for checks
+  // of listening that runs for days.
+  void SetStreamOrigin(int64_t baseband_index);
   // The largest block (samples, channels interleaved) one call can take
   // without cutting into a token held in the buffer; 0 before Initialize.
   int GetMaxSafeInputSize() const;
@@ -168,7 +172,7 @@ class SorvaneDecoder {
   int num_scored_ = 0;
   StreamBuffer received_samples_;
   int64_t samples_processed_ = 0;
-  std::map<int, audio_dsp::FloatVector> symbol_score_cache_;
+  std::map<int64_t, audio_dsp::FloatVector> symbol_score_cache_;
   std::unique_ptr<MultipathScorer> multipath_;
 
   // Scratch, kept to avoid allocation per block.

@@ -1,7 +1,8 @@
 // A growable sample buffer that remembers how many samples have been dropped
 // from its front, so that an index into it maps to an absolute sample number
 // of the stream: sample i of the buffer is stream sample
-// num_discarded_samples() + i.
+// num_discarded_samples() + i. The count is 64-bit: at audio rates it
+// stays exact for millennia of listening, where 32 bits wrap within days.
 //
 // Discard moves the start of the held samples forward and compacts the
 // storage (elements move down) once the dead prefix exceeds a quarter of the
@@ -12,6 +13,7 @@
 #define AUDIO_SORVANE_STREAM_BUFFER_H_
 
 #include <algorithm>
+#include <cstdint>
 #include <span>
 #include <vector>
 
@@ -49,11 +51,12 @@ class StreamBuffer {
     return {buffer_.data() + offset, buffer_.size() - offset};
   }
 
-  // Drops every sample and resets the stream position to 0.
-  void Clear() {
+  // Drops every sample and numbers the next appended sample `origin` (0
+  // unless a test starts the stream far along).
+  void Clear(int64_t origin = 0) {
     buffer_.storage.clear();
     buffer_.start = 0;
-    num_discarded_samples_ = 0;
+    num_discarded_samples_ = origin;
   }
 
   // Overwrites every held sample with 0, keeping the length and position.
@@ -63,7 +66,7 @@ class StreamBuffer {
   }
 
   int size() const { return static_cast<int>(buffer_.size()); }
-  int num_discarded_samples() const { return num_discarded_samples_; }
+  int64_t num_discarded_samples() const { return num_discarded_samples_; }
   // Capacity in samples, for memory accounting.
   int capacity() const { return static_cast<int>(buffer_.storage.capacity()); }
 
@@ -78,7 +81,7 @@ class StreamBuffer {
   };
 
   Samples buffer_;
-  int num_discarded_samples_ = 0;
+  int64_t num_discarded_samples_ = 0;
 };
 
 }  // namespace audio_sorvane
