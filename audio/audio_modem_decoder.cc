@@ -85,9 +85,38 @@ bool AudioModemDecoder::DecodeTokens(DecodeResults* decode_results, int num_mess
     LOG(ERROR) << "num_crc_check_bytes must be non-negative";
     return false;
   }
-  decode_results->tokens.clear();
+  // Results overwrite the entries already in the list, keeping their
+  // storage, so that steady requests allocate nothing.
+  size_t num_tokens = 0;
+  const auto add = [&](const DecodedToken& candidate, size_t num_bytes) {
+    if (num_tokens == decode_results->tokens.size()) {
+      if (spare_tokens_.empty()) {
+        decode_results->tokens.emplace_back();
+      } else {
+        decode_results->tokens.push_back(std::move(spare_tokens_.back()));
+        spare_tokens_.pop_back();
+      }
+    }
+    TokenResult& token = decode_results->tokens[num_tokens++];
+    token.bytes.assign(candidate.bytes.begin(), candidate.bytes.begin() + num_bytes);
+    token.position = candidate.position;
+    token.score_millis = static_cast<int32_t>(std::lround(candidate.score * 1000.0f));
+  };
+  struct Trim {
+    std::vector<TokenResult>* list;
+    std::vector<TokenResult>* spares;
+    const size_t* count;
+    ~Trim() {
+      while (list->size() > *count) {
+        spares->push_back(std::move(list->back()));
+        list->pop_back();
+      }
+    }
+  } trim{&decode_results->tokens, &spare_tokens_, &num_tokens};
 
-  audio_sorvane::DecodeResults raw;
+  audio_sorvane::DecodeResults& raw = raw_;
+  raw.detection_times.reserve(256);  // see below
+  raw.detection_scores.reserve(256);
   bool found = false;
   switch (kind_) {
     case kDsss:
@@ -107,34 +136,33 @@ bool AudioModemDecoder::DecodeTokens(DecodeResults* decode_results, int num_mess
   const bool try_room = kind_ == kDtmf && num_crc_check_bytes == 2;
   if (!found && !try_room) return false;
 
-  const auto result = [](const DecodedToken& candidate, std::vector<uint8_t> bytes) {
-    return TokenResult{std::move(bytes), candidate.position,
-                       static_cast<int32_t>(std::lround(candidate.score * 1000.0f))};
-  };
   if (num_crc_check_bytes == 0) {
-    for (const DecodedToken& candidate : raw.tokens) {
-      decode_results->tokens.push_back(result(candidate, candidate.bytes));
-    }
+    for (const DecodedToken& candidate : raw.tokens) add(candidate, candidate.bytes.size());
     return true;
   }
   if (num_crc_check_bytes == 2) {
     const Crc16Coder coder({.num_message_bytes = num_message_bytes});
     for (const DecodedToken& candidate : raw.tokens) {
       if (!coder.Verify(candidate.bytes)) continue;
-      decode_results->tokens.push_back(result(
-          candidate, std::vector<uint8_t>(candidate.bytes.begin(), candidate.bytes.end() - 2)));
+      add(candidate, candidate.bytes.size() - 2);
     }
-    decode_results->detection_times = std::move(raw.detection_times);
-    decode_results->detection_scores = std::move(raw.detection_scores);
-    if (decode_results->tokens.empty() && try_room && dtmf_decoder_->GetReverberantToken(&raw)) {
+    // Room for a buffer's worth of detections up front, so that later
+    // requests do not grow the lists.
+    constexpr size_t kDetections = 256;
+    decode_results->detection_times.reserve(kDetections);
+    decode_results->detection_scores.reserve(kDetections);
+    decode_results->detection_times.assign(raw.detection_times.begin(),
+                                           raw.detection_times.end());
+    decode_results->detection_scores.assign(raw.detection_scores.begin(),
+                                            raw.detection_scores.end());
+    if (num_tokens == 0 && try_room && dtmf_decoder_->GetReverberantToken(&raw)) {
       for (const DecodedToken& candidate : raw.tokens) {
         if (!coder.Verify(candidate.bytes)) continue;
-        decode_results->tokens.push_back(result(
-            candidate, std::vector<uint8_t>(candidate.bytes.begin(), candidate.bytes.end() - 2)));
+        add(candidate, candidate.bytes.size() - 2);
         break;  // the best fit that passes: later ones only add false-pass risk
       }
     }
-    return !decode_results->tokens.empty();
+    return num_tokens > 0;
   }
   LOG(ERROR) << "Unsupported value for num_crc_check_bytes";
   return false;

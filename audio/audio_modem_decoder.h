@@ -67,6 +67,8 @@ class AudioModemDecoder {
   Kind kind_;
   int token_length_bytes_ = 0;
   std::vector<int16_t> int16_samples_;
+  audio_sorvane::DecodeResults raw_;  // the decoder's results, reused per request
+  std::vector<TokenResult> spare_tokens_;  // results cut from earlier lists
 };
 
 }  // namespace audio_sorvane

@@ -36,10 +36,19 @@ class BatchTopN {
 
   // The best min(added, limit) items, best first.
   std::vector<std::pair<Score, T>> Take() {
-    std::sort(items_.begin(), items_.end(),
-              [](const auto& a, const auto& b) { return a.first > b.first; });
-    if (static_cast<int>(items_.size()) > limit_) items_.resize(limit_);
+    Sort();
     return std::move(items_);
+  }
+  // The same, left in place: valid until the next Add or Clear, and the
+  // storage stays for reuse.
+  const std::vector<std::pair<Score, T>>& Sorted() {
+    Sort();
+    return items_;
+  }
+  // Forgets every item, keeping the storage.
+  void Clear() {
+    items_.clear();
+    has_threshold_ = false;
   }
 
  private:
@@ -47,6 +56,11 @@ class BatchTopN {
     return a.first < b.first;
   }
 
+  void Sort() {
+    std::sort(items_.begin(), items_.end(),
+              [](const auto& a, const auto& b) { return a.first > b.first; });
+    if (static_cast<int>(items_.size()) > limit_) items_.resize(limit_);
+  }
   void Prune() {
     std::nth_element(items_.begin(), items_.begin() + (limit_ - 1), items_.end(),
                      [](const auto& a, const auto& b) { return a.first > b.first; });

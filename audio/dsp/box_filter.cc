@@ -46,72 +46,41 @@ void BoxFilter(const float* input, int num_samples, int stride, int box_width,
   }
 }
 
-namespace {
+namespace internal {
 
-// BoxFilter along each row of a column-major table, all rows at once: the
-// same running sums in the same order as one BoxFilter call per row (so the
-// results are identical), but walking memory column by column instead of
-// jumping num_rows floats per step.
-void BoxFilterRows(const float* input, int num_rows, int num_columns, int box_width,
-                   float* output) {
-  const int n = num_columns;
-  const int ahead = (box_width - 1) / 2;
-  const int back = box_width - ahead;
-  const auto in = [=](int c) { return input + static_cast<ptrdiff_t>(c) * num_rows; };
-  const auto out = [=](int c) { return output + static_cast<ptrdiff_t>(c) * num_rows; };
-  std::vector<double> sum(num_rows, 0.0);
-  for (int j = 0; j < std::min(ahead, n); ++j) {
-    for (int r = 0; r < num_rows; ++r) sum[r] += in(j)[r];
-  }
-  int i = 0;
-  for (; i < std::min(n - ahead, back); ++i) {
-    for (int r = 0; r < num_rows; ++r) {
-      sum[r] += in(i + ahead)[r];
-      out(i)[r] = static_cast<float>(sum[r]);
-    }
-  }
-  if (n >= box_width) {
-    for (; i < n - ahead; ++i) {
-      const float* added = in(i + ahead);
-      const float* removed = in(i - back);
-      for (int r = 0; r < num_rows; ++r) {
-        sum[r] += added[r] - removed[r];
-        out(i)[r] = static_cast<float>(sum[r]);
-      }
-    }
-  } else {
-    for (; i < std::min(n, back); ++i) {
-      for (int r = 0; r < num_rows; ++r) out(i)[r] = static_cast<float>(sum[r]);
-    }
-  }
-  for (; i < n; ++i) {
-    for (int r = 0; r < num_rows; ++r) {
-      sum[r] -= in(i - back)[r];
-      out(i)[r] = static_cast<float>(sum[r]);
-    }
-  }
-}
-
-}  // namespace
-
-void BoxFilter2D(std::span<const float> input, int num_rows, int first_width,
-                 int second_width, bool allow_ragged,
-                 std::vector<float>* output) {
-  CHECK(output);
+std::span<const float> BoxFilter2DFirstPass(std::span<const float> input, int num_rows,
+                                            int first_width, int second_width,
+                                            bool allow_ragged, BoxFilter2DWorkspace* workspace) {
+  CHECK(workspace);
   CHECK(num_rows > 0);
   const int size = static_cast<int>(input.size());
-  output->assign(size, 0.0f);
-  if (size == 0) return;
-  const int num_columns = size / num_rows;
-  if (!allow_ragged && size != num_columns * num_rows) {
+  if (size == 0) return input;
+  if (!allow_ragged && size % num_rows != 0) {
     LOG(FATAL) << "input of size " << size << " is not divisible by "
                << num_rows;
   }
   CHECK(first_width >= 1);
   CHECK(second_width >= 1);
-  std::vector<float> flat(size);
-  BoxFilter(input.data(), size, 1, first_width, flat.data());
-  BoxFilterRows(flat.data(), num_rows, num_columns, second_width, output->data());
+  if (first_width == 1) return input;  // the first pass is the identity
+  workspace->flat.resize(size);
+  BoxFilter(input.data(), size, 1, first_width, workspace->flat.data());
+  return workspace->flat;
+}
+
+}  // namespace internal
+
+void BoxFilter2D(std::span<const float> input, int num_rows, int first_width,
+                 int second_width, bool allow_ragged,
+                 std::vector<float>* output) {
+  CHECK(output);
+  output->assign(input.size(), 0.0f);
+  BoxFilter2DWorkspace workspace;
+  BoxFilter2DByColumn(input, num_rows, first_width, second_width, allow_ragged, &workspace,
+                      [&](int c, const float* values) {
+                        const size_t first = static_cast<size_t>(c) * num_rows;
+                        const size_t count = std::min<size_t>(num_rows, output->size() - first);
+                        std::copy_n(values, count, output->begin() + first);
+                      });
 }
 
 }  // namespace audio_dsp

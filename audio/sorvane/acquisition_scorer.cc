@@ -197,6 +197,7 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
   correlations_real_.assign(num_chunks_, 0.0f);
   correlations_imaginary_.assign(num_chunks_, 0.0f);
   powers_.assign(padded_frequencies_, 0.0f);
+  detection_sums_.setZero(num_frequencies_);
   batch_real_.assign(8 * num_chunks_, 0.0f);
   batch_powers_.assign(8 * num_frequencies_, 0.0f);
   matrix_real_.resize(static_cast<size_t>(num_frequencies_) * num_chunks_);
@@ -325,7 +326,7 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
 
 float AcquisitionScorer::DetectionScore(bool normalize) const {
   if (frame_size_ + (frame_counter_ - first_frame_) <= detection_window_size_) return 0.0f;
-  FloatVector accumulated(num_frequencies_);
+  FloatVector& accumulated = detection_sums_;
   float peak = 0.0f;
   double total = 0.0;
   for (int s = 0; s < detection_num_shifts_; ++s) {

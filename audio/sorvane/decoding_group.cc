@@ -1,6 +1,7 @@
 #include "audio/sorvane/decoding_group.h"
 
 #include <algorithm>
+#include <bitset>
 #include <cmath>
 #include <cstdlib>
 
@@ -16,6 +17,12 @@ DecodingGroup::DecodingGroup(int first_time, int period, int max_gap, float scor
       max_phase_error_(static_cast<int>(std::round(period * phase_tolerance))),
       max_gap_(max_gap),
       times_{first_time} {}
+
+void DecodingGroup::Restart(int first_time, float score) {
+  start_time_ = first_time;
+  score_ = score;
+  times_.assign(1, first_time);
+}
 
 bool DecodingGroup::TryAdd(int time, float score) {
   CHECK(time > times_.back());
@@ -33,12 +40,25 @@ int DecodingGroup::SlotOf(int time) const {
 }
 
 bool DecodingGroup::CoversAllSlots(int num_slots) const {
-  std::vector<bool> marked(num_slots, false);
+  // Marks on the stack for the usual token lengths (receivers ask on every
+  // request and must not allocate); on the heap beyond.
+  constexpr int kStackSlots = 1024;
+  std::bitset<kStackSlots> stack_marks;
+  std::vector<bool> heap_marks(num_slots > kStackSlots ? num_slots : 0, false);
+  int covered = 0;
   for (int t : times_) {
     const int slot = SlotOf(t) % num_slots;  // C remainder: times never precede the start
-    if (slot >= 0) marked[slot] = true;
+    if (slot < 0) continue;
+    const bool seen = num_slots > kStackSlots ? heap_marks[slot] : stack_marks[slot];
+    if (seen) continue;
+    if (num_slots > kStackSlots) {
+      heap_marks[slot] = true;
+    } else {
+      stack_marks[slot] = true;
+    }
+    ++covered;
   }
-  return std::all_of(marked.begin(), marked.end(), [](bool m) { return m; });
+  return covered == num_slots;
 }
 
 int DecodingGroup::IndexOfSlot(int slot) const {

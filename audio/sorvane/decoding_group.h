@@ -7,6 +7,7 @@
 #ifndef AUDIO_SORVANE_DECODING_GROUP_H_
 #define AUDIO_SORVANE_DECODING_GROUP_H_
 
+#include <cstddef>
 #include <vector>
 
 namespace audio_sorvane {
@@ -16,6 +17,13 @@ class DecodingGroup {
   // `phase_tolerance` is a fraction of the period.
   DecodingGroup(int first_time, int period, int max_gap, float score,
                 float phase_tolerance);
+
+  // Starts over from one time with the same period and tolerances, keeping
+  // the storage (so a receiver can reuse its groups from request to request).
+  void Restart(int first_time, float score);
+
+  // Makes room for `count` times.
+  void Reserve(size_t count) { times_.reserve(count); }
 
   // Adds `time` (greater than every time so far) if it is close enough to the
   // last time and on the grid.

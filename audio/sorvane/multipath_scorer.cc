@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <limits>
 #include <numbers>
 
 #include "base/logging.h"
@@ -75,6 +76,21 @@ void Multiply(Complex* a, const Complex* b, int n, bool conjugate) {
   }
 }
 
+// Buffers of one size are lent to frames and given back when the frames are
+// done with them, so a steady stream of frames allocates nothing while only
+// the frames that need a buffer hold one.
+void Borrow(std::vector<std::vector<Complex>>* pool, std::vector<Complex>* buffer) {
+  if (buffer->capacity() > 0 || pool->empty()) return;
+  buffer->swap(pool->back());
+  pool->pop_back();
+}
+
+void GiveBack(std::vector<std::vector<Complex>>* pool, std::vector<Complex>* buffer) {
+  if (buffer->capacity() == 0) return;
+  buffer->clear();
+  pool->emplace_back().swap(*buffer);
+}
+
 // The unit phasor of c (1 when c is 0).
 Complex Direction(Complex c) {
   const float magnitude = std::hypot(c.real(), c.imag());
@@ -110,6 +126,10 @@ MultipathScorer::MultipathScorer(const SymbolWaveCoder& coder,
   fft_.Forward(buffer_.data(), code_spectrum_.data());
   for (auto& c : code_spectrum_) c = std::conj(c);
   real_part_.resize(frame_size_);
+  // Room for the frames of a few seconds of buffer, so the pools do not
+  // grow while streaming.
+  for (auto* pool : {&profile_pool_, &window_pool_, &spectrum_pool_}) pool->reserve(256);
+  spare_frames_.reserve(256);
 }
 
 bool MultipathScorer::HasWindow(const BasebandView& view, int64_t start) const {
@@ -129,12 +149,12 @@ void MultipathScorer::StartTrack(int64_t anchor, float doppler) {
   doppler_ = doppler;
   period_ = Period(doppler);
   SetRotation(doppler);
-  frames_.clear();
+  ForgetBefore(std::numeric_limits<int64_t>::max());
 }
 
 void MultipathScorer::Reset() {
   has_track_ = false;
-  frames_.clear();
+  ForgetBefore(std::numeric_limits<int64_t>::max());
 }
 
 int64_t MultipathScorer::FrameStart(int64_t k) const {
@@ -146,7 +166,35 @@ int64_t MultipathScorer::NearestFrame(int64_t start) const {
 }
 
 void MultipathScorer::ForgetBefore(int64_t k) {
-  frames_.erase(frames_.begin(), frames_.lower_bound(k));
+  // The map nodes are kept, with their score vectors, for later frames.
+  while (!frames_.empty() && frames_.begin()->first < k) {
+    Frame& frame = frames_.begin()->second;
+    GiveBack(&profile_pool_, &frame.profile);
+    GiveBack(&window_pool_, &frame.window);
+    GiveBack(&spectrum_pool_, &frame.spectrum);
+    frame.scored = false;
+    spare_frames_.push_back(frames_.extract(frames_.begin()));
+  }
+}
+
+void MultipathScorer::ReserveFrames(int count) {
+  while (static_cast<int>(frames_.size() + spare_frames_.size()) < count) {
+    std::map<int64_t, Frame> one;
+    one[0].scores.setZero(tones_.rows());
+    spare_frames_.push_back(one.extract(one.begin()));
+  }
+  while (static_cast<int>(profile_pool_.size()) < count) {
+    profile_pool_.emplace_back().reserve(lags_);
+  }
+}
+
+MultipathScorer::Frame& MultipathScorer::FrameAt(int64_t k) {
+  if (auto it = frames_.find(k); it != frames_.end()) return it->second;
+  if (spare_frames_.empty()) return frames_[k];
+  auto node = std::move(spare_frames_.back());
+  spare_frames_.pop_back();
+  node.key() = k;
+  return frames_.insert(std::move(node)).position->second;
 }
 
 void MultipathScorer::SetRotation(float doppler) {
@@ -185,12 +233,19 @@ void MultipathScorer::Transform(const BasebandView& view, int64_t start, bool ke
   const int n = fft_.GetSize();
   Derotate(view, start);
   std::fill(buffer_.begin() + window_, buffer_.end(), std::complex<float>());
-  if (keep_window) frame->window.assign(buffer_.begin(), buffer_.begin() + window_);
+  if (keep_window) {
+    Borrow(&window_pool_, &frame->window);
+    frame->window.assign(buffer_.begin(), buffer_.begin() + window_);
+  }
   // Out of place: KISS FFT allocates a temporary for in-place transforms.
   fft_.Forward(buffer_.data(), spectrum_.data());
-  if (keep_window) frame->spectrum.assign(spectrum_.begin(), spectrum_.end());
+  if (keep_window) {
+    Borrow(&spectrum_pool_, &frame->spectrum);
+    frame->spectrum.assign(spectrum_.begin(), spectrum_.end());
+  }
   Multiply(spectrum_.data(), code_spectrum_.data(), n, false);
   fft_.Inverse(spectrum_.data(), buffer_.data());
+  Borrow(&profile_pool_, &frame->profile);
   frame->profile.assign(buffer_.begin(), buffer_.begin() + lags_);
 }
 
@@ -278,8 +333,10 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
 bool MultipathScorer::Sounded(int64_t k) { return k % kSoundingInterval == 0; }
 
 MultipathScorer::Frame& MultipathScorer::CachedFrame(const BasebandView& view, int64_t k) {
-  Frame& frame = frames_[k];
-  if (frame.profile.empty()) Transform(view, FrameStart(k), !frame.scored, &frame);
+  Frame& frame = FrameAt(k);
+  // Only the profile is kept: a neighbour's window is derotated again if it
+  // is ever scored itself, so at most one window is held at a time.
+  if (frame.profile.empty()) Transform(view, FrameStart(k), false, &frame);
   return frame;
 }
 
@@ -302,6 +359,7 @@ void MultipathScorer::Combine(const std::vector<std::complex<float>>& window,
   if (spectrum->empty()) {
     std::fill(buffer_.begin(), buffer_.end(), std::complex<float>());
     std::copy(window.begin(), window.end(), buffer_.begin());
+    Borrow(&spectrum_pool_, spectrum);
     spectrum->resize(n);
     fft_.Forward(buffer_.data(), spectrum->data());
   }
@@ -335,10 +393,11 @@ bool MultipathScorer::Score(const BasebandView& view, int64_t k, audio_dsp::Floa
   // phase-aligned to the frame's own (a residual Doppler error turns them
   // from frame to frame), averaged. Earlier neighbours whose audio is gone
   // and were never seen are left out.
-  Frame& own = frames_[k];
+  Frame& own = FrameAt(k);
   if (own.window.empty()) {
     if (!HasWindow(view, FrameStart(k))) return false;
     Derotate(view, FrameStart(k));
+    Borrow(&window_pool_, &own.window);
     own.window.assign(buffer_.begin(), buffer_.begin() + window_);
   }
   neighbours_.clear();
@@ -418,13 +477,13 @@ bool MultipathScorer::Score(const BasebandView& view, int64_t k, audio_dsp::Floa
   for (int i = 0; i < frame_size_; ++i) {
     real_part_[i] = c[2 * i] * derotate.real() - c[2 * i + 1] * derotate.imag();
   }
-  own.scores = tones_ * real_part_;
+  own.scores.noalias() = tones_ * real_part_;
   own.scored = true;
-  std::vector<std::complex<float>>().swap(own.spectrum);
-  std::vector<std::complex<float>>().swap(own.window);
+  GiveBack(&spectrum_pool_, &own.spectrum);
+  GiveBack(&window_pool_, &own.window);
   // Profiles further back than any later frame's neighbours are done with.
   for (auto it = frames_.begin(); it != frames_.end() && it->first < k - neighbours; ++it) {
-    if (it->second.scored) std::vector<std::complex<float>>().swap(it->second.profile);
+    if (it->second.scored) GiveBack(&profile_pool_, &it->second.profile);
   }
   *scores = own.scores;
   return true;

@@ -83,6 +83,10 @@ class MultipathScorer {
   // change with more audio). Frames are cached, so each is scored once.
   bool Score(const BasebandView& view, int64_t k, audio_dsp::FloatVector* scores);
 
+  // Sets aside storage for `count` frames, so that a buffer of that many
+  // frames is scored without allocating.
+  void ReserveFrames(int count);
+
   // Drops what is cached for frames before grid index k.
   void ForgetBefore(int64_t k);
 
@@ -104,6 +108,8 @@ class MultipathScorer {
   // the offset of rotation_, correlated with the code.
   void Transform(const BasebandView& view, int64_t start, bool keep_window, Frame* frame);
   Frame& CachedFrame(const BasebandView& view, int64_t k);
+  // The frame at grid index k, added (from a spare node) when absent.
+  Frame& FrameAt(int64_t k);
   // Writes the window of a frame starting at `start`, derotated by the
   // Doppler offset of rotation_ with phase zero at stream index 0, to
   // buffer_.
@@ -137,6 +143,11 @@ class MultipathScorer {
   float doppler_ = 0.0f;
   double period_ = 0.0;
   std::map<int64_t, Frame> frames_;  // by grid index
+  // Storage of forgotten frames, reused for new ones.
+  std::vector<std::map<int64_t, Frame>::node_type> spare_frames_;
+  std::vector<std::vector<std::complex<float>>> profile_pool_;
+  std::vector<std::vector<std::complex<float>>> window_pool_;
+  std::vector<std::vector<std::complex<float>>> spectrum_pool_;
 
   // Scratch.
   std::vector<std::complex<float>> buffer_;

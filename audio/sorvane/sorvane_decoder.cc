@@ -122,7 +122,13 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
   num_scored_ = 0;
   samples_processed_ = 0;
   symbol_score_cache_.clear();
-  if (multipath_ != nullptr) multipath_->Reset();
+  if (multipath_ != nullptr) {
+    multipath_->Reset();
+    // The frames a full buffer holds, and the neighbours around them.
+    const int baseband_frames = static_cast<int>(
+        std::ceil(max_buffer_size_ / input_per_baseband_ / frame_size_));
+    multipath_->ReserveFrames(baseband_frames + 2 * params_.channel_frames + 4);
+  }
   initialized_ = true;
 }
 
@@ -243,44 +249,51 @@ bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
     return false;
   }
   CHECK(decode_results);
-  decode_results->Clear();
+  decode_results->ClearDiagnostics();
 
-  // Acquisition peaks summed over neighbouring symbol periods.
-  std::vector<float> filtered;
-  audio_dsp::BoxFilter2D(acquisition_scores_.View(0), frame_size_, params_.box_width,
-                         params_.num_symbol_periods_to_sum, /*allow_ragged=*/true, &filtered);
+  // Acquisition scores summed over neighbouring symbol periods, handed out
+  // one period (column) at a time; values below the threshold count as 0.
+  // One peak per run of positive values (runs continue across columns),
+  // then peaks on a common grid form groups.
   const float threshold =
       params_.peak_threshold * params_.box_width * params_.num_symbol_periods_to_sum;
-  for (float& v : filtered) v = v < threshold ? 0.0f : v;
-
-  // One peak per run of positive scores (a tight scan first: most of the
-  // buffer is below threshold), then peaks on a common grid form groups.
-  std::vector<int> peaks;
-  const float* values = filtered.data();
-  const int size = static_cast<int>(filtered.size());
-  for (int i = 0; i < size;) {
-    while (i < size && values[i] <= 0.0f) ++i;
-    if (i == size) break;
-    int peak = i;
-    for (; i < size && values[i] > 0.0f; ++i) {
-      if (values[i] > values[peak]) peak = i;
-    }
-    peaks.push_back(peak);
-  }
-  std::vector<DecodingGroup> groups;
-  for (int peak : peaks) {
+  peaks_.clear();
+  bool in_run = false;
+  Peak run_peak{};
+  audio_dsp::BoxFilter2DByColumn(
+      acquisition_scores_.View(0), frame_size_, params_.box_width,
+      params_.num_symbol_periods_to_sum, /*allow_ragged=*/true, &box_workspace_,
+      [&](int column, const float* values) {
+        const int first = column * frame_size_;
+        for (int r = 0; r < frame_size_; ++r) {
+          const float v = values[r] < threshold ? 0.0f : values[r];
+          if (v > 0.0f) {
+            if (!in_run || v > run_peak.score) run_peak = {first + r, v};
+            in_run = true;
+          } else if (in_run) {
+            peaks_.push_back(run_peak);
+            in_run = false;
+          }
+        }
+      });
+  if (in_run) peaks_.push_back(run_peak);
+  int num_groups = 0;
+  for (const Peak& peak : peaks_) {
     bool added = false;
-    for (DecodingGroup& group : groups) {
-      if (group.TryAdd(peak, filtered[peak])) {
-        added = true;
-        break;
-      }
+    for (int g = 0; g < num_groups && !added; ++g) added = groups_[g].TryAdd(peak.time, peak.score);
+    if (added) continue;
+    if (num_groups == static_cast<int>(groups_.size())) {
+      groups_.emplace_back(peak.time, frame_size_, params_.max_gap, peak.score,
+                           params_.max_phase_error);
+    } else {
+      groups_[num_groups].Restart(peak.time, peak.score);
     }
-    if (!added) {
-      groups.emplace_back(peak, frame_size_, params_.max_gap, filtered[peak],
-                          params_.max_phase_error);
-    }
+    // Room for every peak, so the group's times never grow while adding
+    // (a few hundred covers a buffer of tokens; more only when noise is
+    // dense with peaks).
+    groups_[num_groups++].Reserve(std::max<size_t>(256, peaks_.size()));
   }
+  const std::span<const DecodingGroup> groups(groups_.data(), num_groups);
 
   // Prefer groups that saw every slot of the token period.
   const int period = token_selector_->symbol_period();
@@ -293,27 +306,30 @@ bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
     }
     if (chosen != nullptr) break;
   }
-  if (chosen == nullptr) return false;
+  if (chosen == nullptr) {
+    // No candidates and an all-zero table; storage kept for later requests.
+    token_selector_->ReleaseCandidates(&decode_results->tokens);
+    decode_results->scores_table.setZero();
+    return false;
+  }
 
   const int64_t discarded = baseband_real_.num_discarded_samples();
   const auto seconds = [&](int t) {
     return static_cast<float>(static_cast<double>(discarded + t) / baseband_rate_);
   };
-  if (multipath_ != nullptr) {
-    for (int t : chosen->times()) {
-      decode_results->detection_times.push_back(seconds(t));
-      decode_results->detection_scores.push_back(filtered[t]);
-    }
-    ScoreGroupOverMultipath(*chosen, filtered, &decode_results->symbol_scores);
-  }
-  FloatVector scores;
-  for (int t : multipath_ != nullptr ? std::vector<int>() : chosen->times()) {
+  for (int t : chosen->times()) {
     decode_results->detection_times.push_back(seconds(t));
-    decode_results->detection_scores.push_back(filtered[t]);
-    if (!ComputeSymbolScores(RefinePeak(t), &scores)) continue;
-    const int slot = chosen->SlotOf(t);
-    auto [it, inserted] = decode_results->symbol_scores.try_emplace(slot, scores);
-    if (!inserted) it->second += scores;
+    decode_results->detection_scores.push_back(PeakScore(t));
+  }
+  if (multipath_ != nullptr) {
+    ScoreGroupOverMultipath(*chosen, &decode_results->symbol_scores);
+  } else {
+    for (int t : chosen->times()) {
+      if (!ComputeSymbolScores(RefinePeak(t), &scores_)) continue;
+      const int slot = chosen->SlotOf(t);
+      auto [it, inserted] = decode_results->symbol_scores.try_emplace(slot, scores_);
+      if (!inserted) it->second += scores_;
+    }
   }
 
   token_selector_->SelectTokens(decode_results->symbol_scores, &decode_results->scores_table,
@@ -325,28 +341,35 @@ bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
   return !decode_results->tokens.empty();
 }
 
+float SorvaneDecoder::PeakScore(int t) const {
+  const auto it = std::lower_bound(peaks_.begin(), peaks_.end(), t,
+                                   [](const Peak& peak, int time) { return peak.time < time; });
+  CHECK(it != peaks_.end() && it->time == t);
+  return it->score;
+}
+
 void SorvaneDecoder::ScoreGroupOverMultipath(const DecodingGroup& group,
-                                             std::span<const float> filtered,
                                              SymbolScoreMap* symbol_scores) {
   // One frame per slot: the detection with the highest summed score (the
   // others are the same frame seen through other paths).
-  struct SlotFrame {
-    int slot;
-    int64_t start;  // absolute
-    float score;
-  };
   const int64_t discarded = baseband_real_.num_discarded_samples();
   const BasebandView view{baseband_real_.View(0), baseband_imaginary_.View(0), discarded};
-  std::vector<SlotFrame> frames;
+  std::vector<SlotFrame>& frames = slot_frames_;
+  frames.clear();
   const SlotFrame* reference = nullptr;
   const std::vector<int>& times = group.times();
   for (size_t i = 0; i < times.size();) {
     const int slot = group.SlotOf(times[i]);
     size_t best = i;
+    float best_score = PeakScore(times[i]);
     for (; i < times.size() && group.SlotOf(times[i]) == slot; ++i) {
-      if (filtered[times[i]] > filtered[times[best]]) best = i;
+      const float score = PeakScore(times[i]);
+      if (score > best_score) {
+        best = i;
+        best_score = score;
+      }
     }
-    frames.push_back({slot, discarded + RefinePeak(times[best]), filtered[times[best]]});
+    frames.push_back({slot, discarded + RefinePeak(times[best]), best_score});
   }
   for (const SlotFrame& frame : frames) {
     if (!multipath_->HasWindow(view, frame.start)) continue;
@@ -363,10 +386,9 @@ void SorvaneDecoder::ScoreGroupOverMultipath(const DecodingGroup& group,
     multipath_->StartTrack(reference->start,
                            multipath_->SearchDoppler(view, reference->start));
   }
-  FloatVector scores;
   for (const SlotFrame& frame : frames) {
-    if (multipath_->Score(view, multipath_->NearestFrame(frame.start), &scores)) {
-      symbol_scores->emplace(frame.slot, scores);
+    if (multipath_->Score(view, multipath_->NearestFrame(frame.start), &scores_)) {
+      symbol_scores->try_emplace(frame.slot, scores_);
     }
   }
   // Frames that start before the buffer will not be asked for again.

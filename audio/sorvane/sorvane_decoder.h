@@ -25,6 +25,7 @@
 #include <span>
 #include <vector>
 
+#include "audio/dsp/box_filter.h"
 #include "audio/dsp/eigen_types.h"
 #include "audio/dsp/rational_factor_resampler.h"
 #include "audio/dsp/signal_vector_util.h"
@@ -85,10 +86,15 @@ struct DecodeResults {
   // Empties everything, keeping allocated capacity for the next request.
   void Clear() {
     tokens.clear();
+    scores_table.resize(0, 0);
+    ClearDiagnostics();
+  }
+  // Empties the detections and symbol scores, leaving the candidates and the
+  // table for the token selector to overwrite in place.
+  void ClearDiagnostics() {
     detection_times.clear();
     detection_scores.clear();
     symbol_scores.clear();
-    scores_table.resize(0, 0);
   }
 };
 
@@ -136,8 +142,9 @@ class SorvaneDecoder {
   bool ComputeSymbolScores(int t, audio_dsp::FloatVector* symbol_scores);
   // Symbol scores of the chosen group's frames, one per slot, gathered
   // over the multipath.
-  void ScoreGroupOverMultipath(const DecodingGroup& group, std::span<const float> filtered,
-                               SymbolScoreMap* symbol_scores);
+  void ScoreGroupOverMultipath(const DecodingGroup& group, SymbolScoreMap* symbol_scores);
+  // The summed acquisition score of the peak at buffer index t.
+  float PeakScore(int t) const;
 
   std::shared_ptr<const SymbolWaveCoder> coder_;
   SorvaneDecoderParams params_;
@@ -182,6 +189,21 @@ class SorvaneDecoder {
   std::vector<std::complex<float>> filtered_;
   std::vector<float> parts_;
   std::vector<float> new_scores_;
+  // Per-request scratch, so that requests allocate nothing once warm.
+  struct Peak {
+    int time;     // buffer index
+    float score;  // summed acquisition score
+  };
+  struct SlotFrame {
+    int slot;
+    int64_t start;  // absolute
+    float score;
+  };
+  audio_dsp::BoxFilter2DWorkspace box_workspace_;
+  std::vector<Peak> peaks_;            // ascending time
+  std::vector<DecodingGroup> groups_;  // the first few are this request's
+  std::vector<SlotFrame> slot_frames_;
+  audio_dsp::FloatVector scores_;
 };
 
 }  // namespace audio_sorvane

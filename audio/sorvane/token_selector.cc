@@ -1,7 +1,7 @@
 #include "audio/sorvane/token_selector.h"
 
 #include <algorithm>
-#include <queue>
+#include <functional>
 #include <tuple>
 
 #include "audio/dsp/batch_top_n.h"
@@ -28,6 +28,24 @@ TokenSelector::TokenSelector(const TokenSelectorParams& params) : params_(params
   CHECK(params_.max_candidates_rank >= params_.max_candidates_to_return);
   CHECK(params_.token_threshold_factor >= 0);
   symbol_period_ = params_.symbols_in_token + (params_.append_check_symbol ? 1 : 0) + 1;
+  scratch_.top = audio_dsp::BatchTopN<int>(params_.max_candidates_rank);
+  // Scratch at its largest sizes, so selections never grow it.
+  scratch_.runners_up.reserve(static_cast<size_t>(params_.alphabet_size) * symbol_period_);
+  scratch_.choices.resize(symbol_period_);
+  for (std::vector<int>& choices : scratch_.choices) choices.reserve(params_.alphabet_size);
+  scratch_.spare_candidates.resize(params_.max_candidates_to_return);
+  for (DecodedToken& spare : scratch_.spare_candidates) {
+    spare.symbols.reserve(symbol_period_);
+    spare.bytes.reserve(symbol_period_);  // a byte takes at least one symbol
+  }
+}
+
+void TokenSelector::ReleaseCandidates(std::vector<DecodedToken>* token_candidates) const {
+  CHECK(token_candidates);
+  while (!token_candidates->empty()) {
+    scratch_.spare_candidates.push_back(std::move(token_candidates->back()));
+    token_candidates->pop_back();
+  }
 }
 
 void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
@@ -35,37 +53,55 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
                                  std::vector<DecodedToken>* token_candidates) const {
   CHECK(scores_table);
   CHECK(token_candidates);
-  token_candidates->clear();
+  size_t num_candidates = 0;
+  // Candidates overwrite the entries already in the list, keeping their
+  // storage; on every way out the list is cut to the new count, the entries
+  // cut off kept as spares for later selections.
+  struct Trim {
+    std::vector<DecodedToken>* list;
+    std::vector<DecodedToken>* spares;
+    const size_t* count;
+    ~Trim() {
+      while (list->size() > *count) {
+        spares->push_back(std::move(list->back()));
+        list->pop_back();
+      }
+    }
+  } trim{token_candidates, &scratch_.spare_candidates, &num_candidates};
   const int rows = params_.alphabet_size;
   const int period = symbol_period_;
+  Scratch& s = scratch_;
 
   // Threshold each position, normalise it and fold it onto the period.
   scores_table->setZero(rows, period);
-  std::vector<int> first_position(period, -1);
+  s.first_position.assign(period, -1);
   for (const auto& [position, scores] : symbol_scores) {
     CHECK(scores.size() == params_.alphabet_size);
     const float threshold = params_.token_threshold_factor * scores.maxCoeff();
-    audio_dsp::FloatVector kept = (scores.array() - threshold).max(0.0f).matrix();
-    const float sum = kept.sum();
-    if (sum != 0.0f) kept /= sum;
+    s.kept = (scores.array() - threshold).max(0.0f).matrix();
+    const float sum = s.kept.sum();
+    if (sum != 0.0f) s.kept /= sum;
     const int column = ((position % period) + period) % period;
-    scores_table->col(column) += kept;
-    if (first_position[column] == -1) first_position[column] = position;
+    scores_table->col(column) += s.kept;
+    if (s.first_position[column] == -1) s.first_position[column] = position;
   }
   for (int c = 0; c < period; ++c) {
     const float sum = scores_table->col(c).sum();
     if (sum != 0.0f) scores_table->col(c) /= sum;
   }
-  if (std::find(first_position.begin(), first_position.end(), -1) != first_position.end()) {
+  if (std::find(s.first_position.begin(), s.first_position.end(), -1) !=
+      s.first_position.end()) {
     return;  // a slot never observed
   }
 
   // Prune the weakest runners-up until few enough combinations remain. The
-  // best entry of each column always stays.
+  // best entry of each column always stays. (A min-heap on the value, then
+  // row and column.)
   const int limit = params_.max_candidates_to_consider;
-  std::vector<int> counts(period, 0);
-  using Entry = std::tuple<float, int, int>;  // value, row, column
-  std::priority_queue<Entry, std::vector<Entry>, std::greater<Entry>> runners_up;
+  s.counts.assign(period, 0);
+  std::vector<Entry>& runners_up = s.runners_up;
+  runners_up.clear();
+  const auto heap_order = std::greater<Entry>();
   for (int c = 0; c < period; ++c) {
     int best = 0;
     for (int r = 0; r < rows; ++r) {
@@ -74,53 +110,62 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
     for (int r = 0; r < rows; ++r) {
       const float v = (*scores_table)(r, c);
       if (v > 0.0f) {
-        ++counts[c];
-        if (r != best) runners_up.emplace(v, r, c);
+        ++s.counts[c];
+        if (r != best) {
+          runners_up.emplace_back(v, r, c);
+          std::push_heap(runners_up.begin(), runners_up.end(), heap_order);
+        }
       }
     }
   }
   const auto combinations = [&] {
     int64_t product = 1;
-    for (int count : counts) product = std::min<int64_t>(product * count, limit + 1);
+    for (int count : s.counts) product = std::min<int64_t>(product * count, limit + 1);
     return product;
   };
   while (combinations() > limit && !runners_up.empty()) {
-    const auto [value, r, c] = runners_up.top();
-    runners_up.pop();
+    std::pop_heap(runners_up.begin(), runners_up.end(), heap_order);
+    const auto [value, r, c] = runners_up.back();
+    runners_up.pop_back();
     (*scores_table)(r, c) = 0.0f;
-    --counts[c];
+    --s.counts[c];
   }
 
-  // Enumerate the combinations as an odometer, column 0 fastest.
+  // Enumerate the combinations as an odometer, column 0 fastest; the best
+  // are kept by their number in that order.
   CHECK(scores_table->rows() == params_.alphabet_size);
   CHECK(scores_table->cols() == symbol_period_);
-  std::vector<std::vector<int>> choices(period);
+  s.choices.resize(period);
   for (int c = 0; c < period; ++c) {
+    s.choices[c].clear();
     for (int r = 0; r < rows; ++r) {
-      if ((*scores_table)(r, c) > 0.0f) choices[c].push_back(r);
+      if ((*scores_table)(r, c) > 0.0f) s.choices[c].push_back(r);
     }
-    if (choices[c].empty()) return;
+    if (s.choices[c].empty()) return;
   }
-  audio_dsp::BatchTopN<std::vector<int>> top(params_.max_candidates_rank);
-  std::vector<int> odometer(period, 0);
-  std::vector<int> symbols(period);
+  s.top.Clear();
+  s.odometer.assign(period, 0);
   for (int visited = 0; visited < limit; ++visited) {
     float score = 0.0f;
-    for (int c = 0; c < period; ++c) {
-      symbols[c] = choices[c][odometer[c]];
-      score += (*scores_table)(symbols[c], c);
-    }
-    top.Add(score, symbols);
+    for (int c = 0; c < period; ++c) score += (*scores_table)(s.choices[c][s.odometer[c]], c);
+    s.top.Add(score, visited);
     int c = 0;
-    while (c < period && ++odometer[c] == static_cast<int>(choices[c].size())) {
-      odometer[c++] = 0;
+    while (c < period && ++s.odometer[c] == static_cast<int>(s.choices[c].size())) {
+      s.odometer[c++] = 0;
     }
     if (c == period) break;  // wrapped: every combination visited
   }
 
   // Keep candidates with exactly one spacer and a matching check symbol,
   // rotated to start right after the spacer.
-  for (auto& [score, sequence] : top.Take()) {
+  std::vector<int>& sequence = s.sequence;
+  for (const auto& [score, number] : s.top.Sorted()) {
+    sequence.resize(period);
+    for (int c = 0, rest = number; c < period; ++c) {
+      const int size = static_cast<int>(s.choices[c].size());
+      sequence[c] = s.choices[c][rest % size];
+      rest /= size;
+    }
     if (std::count(sequence.begin(), sequence.end(), params_.spacer) != 1) continue;
     const int k = static_cast<int>(
         std::find(sequence.begin(), sequence.end(), params_.spacer) - sequence.begin());
@@ -131,11 +176,20 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
       sequence.pop_back();
       if (check != ComputeCheckSymbol(params_.alphabet_size, sequence)) continue;
     }
-    token_candidates->push_back(
-        {std::move(sequence), score, {}, first_position[k]});
-    if (static_cast<int>(token_candidates->size()) == params_.max_candidates_to_return) {
-      break;
+    if (num_candidates == token_candidates->size()) {
+      if (s.spare_candidates.empty()) {
+        token_candidates->emplace_back();
+      } else {
+        token_candidates->push_back(std::move(s.spare_candidates.back()));
+        s.spare_candidates.pop_back();
+      }
     }
+    DecodedToken& candidate = (*token_candidates)[num_candidates++];
+    candidate.symbols.assign(sequence.begin(), sequence.end());
+    candidate.score = score;
+    candidate.bytes.clear();
+    candidate.position = s.first_position[k];
+    if (static_cast<int>(num_candidates) == params_.max_candidates_to_return) break;
   }
 }
 

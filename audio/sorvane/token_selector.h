@@ -10,17 +10,20 @@
 // summed score and returns those with exactly one spacer and a matching
 // check symbol, rotated to start after the spacer.
 //
-// Immutable after construction. Invalid parameters and mismatched sizes end
+// Not thread safe: a selection reuses scratch storage kept by the selector, so
+// that steady requests allocate nothing. Invalid parameters and mismatched sizes end
 // the process through CHECK; a slot never observed just gives no candidates.
 #ifndef AUDIO_SORVANE_TOKEN_SELECTOR_H_
 #define AUDIO_SORVANE_TOKEN_SELECTOR_H_
 
 #include <cstdint>
-#include <map>
 #include <span>
+#include <tuple>
 #include <vector>
 
+#include "audio/dsp/batch_top_n.h"
 #include "audio/dsp/eigen_types.h"
+#include "audio/sorvane/symbol_score_map.h"
 
 namespace audio_sorvane {
 
@@ -49,9 +52,6 @@ struct TokenSelectorParams {
   float token_threshold_factor = 1.0f / 3.0f;
 };
 
-// Symbol position (a running symbol index) -> one score per symbol value.
-using SymbolScoreMap = std::map<int, audio_dsp::FloatVector>;
-
 class TokenSelector {
  public:
   explicit TokenSelector(const TokenSelectorParams& params);
@@ -62,12 +62,30 @@ class TokenSelector {
                     audio_dsp::FloatMatrix* scores_table,
                     std::vector<DecodedToken>* token_candidates) const;
 
+  // Empties `token_candidates`, keeping the entries' storage for later
+  // selections.
+  void ReleaseCandidates(std::vector<DecodedToken>* token_candidates) const;
+
   int symbol_period() const { return symbol_period_; }
   const TokenSelectorParams& params() const { return params_; }
 
  private:
+  using Entry = std::tuple<float, int, int>;  // value, row, column
+  struct Scratch {
+    std::vector<int> first_position;
+    audio_dsp::FloatVector kept;
+    std::vector<int> counts;
+    std::vector<Entry> runners_up;
+    std::vector<std::vector<int>> choices;
+    std::vector<int> odometer;
+    std::vector<int> sequence;
+    audio_dsp::BatchTopN<int> top{1};
+    std::vector<DecodedToken> spare_candidates;
+  };
+
   TokenSelectorParams params_;
   int symbol_period_;
+  mutable Scratch scratch_;
 };
 
 }  // namespace audio_sorvane

@@ -127,7 +127,9 @@ TEST(TokenSelectorDeathTest, RejectsInvalidParameters) {
   const TokenSelector selector(SmallParams());
   audio_dsp::FloatMatrix table;
   std::vector<DecodedToken> out;
-  EXPECT_DEATH(selector.SelectTokens({{0, FloatVector::Zero(4)}}, &table, &out),
+  SymbolScoreMap wrong_size;
+  wrong_size[0] = FloatVector::Zero(4);
+  EXPECT_DEATH(selector.SelectTokens(wrong_size, &table, &out),
                sorvel_test::CheckFailed("scores.size() == params_.alphabet_size"));
   EXPECT_DEATH(audio_dsp::BatchTopN<int>(0), sorvel_test::CheckFailed("limit >= 1"));
 }
