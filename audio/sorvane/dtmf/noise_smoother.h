@@ -1,4 +1,4 @@
-// The DTMF decoder's delay-compensated gamma smoother (Part 5.5): a gamma
+// The DTMF decoder's delay-compensated gamma smoother: a gamma
 // filter of `order` stages whose delay d is removed by priming every stage
 // with the mean of the first d inputs, dropping the first d outputs and
 // flushing with the mean of the last d inputs.

@@ -12,7 +12,7 @@
 //   z = e^{i theta_start} * sum_n x[n] e^{i n omega}
 // from per-filter tables of cos / sin(n omega), n < decimation_factor, and one
 // rotation by the exact oscillator phase at the block start.
-// ProcessSamplesReference is the direct form of the spec (Part 5.4), a table
+// ProcessSamplesReference is the direct form, a sine-table
 // lookup per sample whose phase is quantised to 4096 steps. The two differ
 // only by that quantisation (at most pi / 4096 rad per sample) and float
 // rounding: block sums agree within 1e-3 * sum |x| over the block, strengths
