@@ -35,6 +35,16 @@ inline void Transpose4(Float4& a, Float4& b, Float4& c, Float4& d) {
   d = __builtin_shufflevector(t2, t3, 2, 3, 6, 7);
 }
 
+// Lane-wise maximum (exact; for ordered values the same as std::max).
+inline Float4 Max4(Float4 a, Float4 b) { return a < b ? b : a; }
+
+// The largest lane.
+inline float MaxLane4(Float4 v) {
+  const float a = v[0] < v[1] ? v[1] : v[0];
+  const float b = v[2] < v[3] ? v[3] : v[2];
+  return a < b ? b : a;
+}
+
 }  // namespace audio_dsp
 
 #endif  // AUDIO_DSP_FLOAT4_H_

@@ -17,6 +17,13 @@ namespace audio_dsp {
 // window [j + ahead - w + 1, j + ahead] clipped to the signal.
 void MaxFilter(const float* input, int num_samples, int window_size, float* output) {
   CHECK(num_samples >= 0);
+  std::vector<float> scratch(2 * static_cast<size_t>(num_samples));
+  MaxFilter(input, num_samples, window_size, output, scratch.data());
+}
+
+void MaxFilter(const float* input, int num_samples, int window_size, float* output,
+               float* scratch) {
+  CHECK(num_samples >= 0);
   CHECK(window_size >= 1);
   if (num_samples == 0) return;
   CHECK(input);
@@ -24,7 +31,8 @@ void MaxFilter(const float* input, int num_samples, int window_size, float* outp
   const int n = num_samples;
   const int w = window_size;
   const int ahead = (w - 1) / 2;
-  std::vector<float> prefix(n), suffix(n);
+  float* const prefix = scratch;
+  float* const suffix = scratch + n;
   for (int block = 0; block < n; block += w) {
     const int end = std::min(n, block + w);
     // Both running maxima in one loop: two independent dependency chains
@@ -60,8 +68,8 @@ void MaxFilter(const float* input, int num_samples, int window_size, float* outp
   const int interior_begin = std::min(n, w - 1 - ahead + 1);  // first > 0
   const int interior_end = std::max(interior_begin, n - 1 - ahead);  // last < n - 1
   for (int j = 0; j < interior_begin; ++j) output[j] = clipped(j);
-  const float* suffix_at = suffix.data() + (ahead - w + 1);
-  const float* prefix_at = prefix.data() + ahead;
+  const float* suffix_at = suffix + (ahead - w + 1);
+  const float* prefix_at = prefix + ahead;
   for (int j = interior_begin; j < interior_end; ++j) {
     output[j] = std::max(suffix_at[j], prefix_at[j]);
   }

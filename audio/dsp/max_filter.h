@@ -14,6 +14,9 @@ namespace audio_dsp {
 // `input` and `output` hold `num_samples` floats; they may be the same array.
 void MaxFilter(const float* input, int num_samples, int window_size,
                float* output);
+// As above without allocating: `scratch` holds 2 * num_samples floats.
+void MaxFilter(const float* input, int num_samples, int window_size,
+               float* output, float* scratch);
 
 }  // namespace audio_dsp
 

@@ -5,6 +5,7 @@
 #include <complex>
 #include <numbers>
 
+#include "audio/dsp/float4.h"
 #include "audio/dsp/gamma_filter.h"
 #include "audio/dsp/max_filter.h"
 #include "audio/dsp/number_util.h"
@@ -69,13 +70,20 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
   const double cutoff = static_cast<double>(highest * params_.max_meters_per_second) /
                             kSpeedOfSound +
                         0.594 / frame_duration_;
-  for (float tone : params_.tone_frequencies) {
-    tone_strength_filters_.emplace_back(params_.baseband_decimation_factor,
-                                        params_.sample_rate, tone, cutoff);
-  }
-  tone_strength_buffers_.resize(num_frequencies_);
+  tone_bank_ = std::make_unique<ToneFilterBank>(params_.baseband_decimation_factor,
+                                                params_.sample_rate, params_.tone_frequencies,
+                                                cutoff, params_.use_reference_paths);
+  const int order = params_.noise_estimate_filter_order;
+  smoother_ = std::make_unique<AlignedGammaSmoother>(
+      order, baseband_sample_rate_,
+      audio_dsp::GammaFilterPoleFromStddev(
+          params_.noise_estimate_filter_stddev * baseband_frame_size_, order));
+  column_scores_.resize(num_frequencies_);
+  top_.resize(params_.tones_per_symbol);
+  folded_.resize(baseband_frame_size_);
 
-  // The coherent path, when the token layout fits the search's limits.
+  // The coherent path, when the token layout fits the search's limits. The
+  // search's tables are built on its first use.
   const RoomSearchParams& room = params_.room_search;
   ToneSequenceSearchParams search;
   search.num_tones = num_frequencies_;
@@ -83,24 +91,88 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
   search.tones_per_symbol = params_.tones_per_symbol;
   search.num_taps = room.num_taps;
   search.masks_per_tone = room.masks_per_tone;
+  search_params_ = search;
   if (room.enabled && ToneSequenceSearch::Supported(search)) {
-    sequence_search_ = std::make_unique<ToneSequenceSearch>(search);
-    tone_block_buffers_.resize(num_frequencies_);
-    for (const ToneStrengthFilter& filter : tone_strength_filters_) {
+    search_supported_ = true;
+    for (int k = 0; k < num_frequencies_; ++k) {
       frame_phase_steps_.push_back(static_cast<uint32_t>(params_.baseband_decimation_factor) *
-                                   filter.phase_increment());
+                                   tone_bank_->filter(k).phase_increment());
     }
-    frame_window_.resize(baseband_frame_size_);
-    for (int m = 0; m < baseband_frame_size_; ++m) {
-      frame_window_[m] = static_cast<float>(
-          std::sin(std::numbers::pi * (m + 0.5) / baseband_frame_size_));
+    const int period = baseband_frame_size_;
+    const double phi = std::numbers::pi / period;
+    for (int j = 0; j < 2 * period; ++j) {
+      window_twiddles_.push_back(std::polar(1.0, phi * (j + 0.5)));
+      start_twiddles_.push_back(std::polar(1.0, phi * j));
     }
+    const int candidates = room.timing_candidates;
+    candidate_at_.assign(period, -1);
+    for (int c = 0; c < candidates; ++c) {
+      candidate_offset_.push_back(c * period / candidates);
+      candidate_at_[candidate_offset_.back() % period] = c;
+    }
+    running_a_.resize(num_frequencies_);
+    running_b_.resize(num_frequencies_);
+    window_a_.resize(static_cast<size_t>(candidates) * num_frequencies_);
+    window_b_.resize(window_a_.size());
+    window_start_.resize(candidates);
+    frame_values_.resize(static_cast<size_t>(candidates) * room.max_frames * num_frequencies_);
+    frame_starts_.resize(static_cast<size_t>(candidates) * room.max_frames);
+    frame_count_.resize(candidates);
+    frame_next_.resize(candidates);
     for (size_t s = 0; s < params_.symbol_table.size(); ++s) {
       uint32_t bits = 0;
       for (int tone : params_.symbol_table[s]) bits |= 1u << tone;
       symbol_of_tones_[bits] = static_cast<int>(s);
     }
   }
+}
+
+void ColumnRing::Init(int rows, int capacity) {
+  rows_ = rows;
+  capacity_ = std::max(capacity, 1);
+  const size_t size = static_cast<size_t>(rows_) * capacity_;
+  if (data_.size() != size) {
+    data_.assign(size, 0.0f);
+    data_.shrink_to_fit();
+  }
+}
+
+void ColumnRing::Reserve(int capacity, int64_t from, int64_t to) {
+  if (capacity <= capacity_) return;
+  ColumnRing grown;
+  grown.Init(rows_, capacity);
+  std::vector<float> row(static_cast<size_t>(to - from));
+  for (int r = 0; r < rows_; ++r) {
+    Read(r, from, static_cast<int>(to - from), row.data());
+    grown.Write(r, from, row.data(), static_cast<int>(to - from));
+  }
+  *this = std::move(grown);
+}
+
+void ColumnRing::Write(int row, int64_t position, const float* values, int count) {
+  float* base = data_.data() + static_cast<size_t>(row) * capacity_;
+  int at = static_cast<int>(position % capacity_);
+  while (count > 0) {
+    const int n = std::min(count, capacity_ - at);
+    std::copy_n(values, n, base + at);
+    values += n;
+    count -= n;
+    at = 0;
+  }
+}
+
+void ColumnRing::Read(int row, int64_t position, int count, float* values) const {
+  const auto [a, b] = Pieces(row, position, count);
+  std::copy(a.begin(), a.end(), values);
+  std::copy(b.begin(), b.end(), values + a.size());
+}
+
+std::pair<std::span<const float>, std::span<const float>> ColumnRing::Pieces(
+    int row, int64_t position, int count) const {
+  const float* base = data_.data() + static_cast<size_t>(row) * capacity_;
+  const int at = static_cast<int>(position % capacity_);
+  const int n = std::min(count, capacity_ - at);
+  return {std::span<const float>(base + at, n), std::span<const float>(base, count - n)};
 }
 
 void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
@@ -122,21 +194,33 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
     CHECK(received_resampler_->Valid()) << "Failed to initialize RationalFactorResampler.";
   }
   tone_strength_buffer_size_ = 0;
-  for (ToneStrengthFilter& filter : tone_strength_filters_) filter.Reset();
-  for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Clear();
-  for (StreamBuffer& buffer : tone_block_buffers_) buffer.Clear();
+  begin_ = 0;
+  tone_bank_->Reset();
+  // The buffers hold at most the budget's worth of baseband samples (see
+  // ProcessSamples); a little more covers the resampler's rounding.
+  const int capacity =
+      static_cast<int>(std::ceil(max_buffer_size_ / received_per_baseband_)) + 64;
+  strengths_.Init(num_frequencies_, capacity);
+  columns_.Init(2, capacity);
+  acquisition_.reserve(capacity);
   last_search_end_ = -1;
-  tone_scores_.resize(0, 0);
-  column_signal_.clear();
-  column_noise_.clear();
   columns_begin_ = 0;
+  columns_length_ = 0;
+  block_position_ = 0;
+  std::fill(running_a_.begin(), running_a_.end(), 0.0);
+  std::fill(running_b_.begin(), running_b_.end(), 0.0);
+  for (size_t c = 0; c < window_start_.size(); ++c) {
+    // A window starting at 0 opens with empty sums; the others open when
+    // the stream reaches their offset.
+    window_start_[c] = candidate_offset_[c] == 0 ? 0 : -1;
+    frame_count_[c] = frame_next_[c] = 0;
+  }
+  std::fill(window_a_.begin(), window_a_.end(), 0.0);
+  std::fill(window_b_.begin(), window_b_.end(), 0.0);
   initialized_ = true;
 }
 
-void DtmfDecoder::Reset() {
-  for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Clear();
-  Init(num_channels_, received_sample_rate_);
-}
+void DtmfDecoder::Reset() { Init(num_channels_, received_sample_rate_); }
 
 int DtmfDecoder::GetMaxSafeInputSize() const {
   if (!initialized_) return 0;
@@ -167,15 +251,14 @@ void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
     // Whole symbol periods, so the symbol phase of the buffers is kept.
     const int drop = std::min(audio_dsp::RoundUpToMultiple(drop_baseband, baseband_frame_size_),
                               tone_strength_buffer_size_);
-    for (StreamBuffer& buffer : tone_strength_buffers_) buffer.Discard(drop);
-    for (StreamBuffer& buffer : tone_block_buffers_) buffer.Discard(2 * drop);
+    begin_ += drop;
     tone_strength_buffer_size_ -= drop;
   }
 
   std::span<const float> mono = received_samples;
   if (num_channels_ > 1) {
     CHECK(received_samples.size() % num_channels_ == 0);
-    mono_.assign(received_samples.size() / num_channels_, 0.0f);
+    mono_.resize(received_samples.size() / num_channels_);
     for (size_t i = 0; i < mono_.size(); ++i) {
       float sum = 0.0f;
       for (int c = 0; c < num_channels_; ++c) sum += received_samples[i * num_channels_ + c];
@@ -187,164 +270,217 @@ void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
     received_resampler_->ProcessSamples(mono, &resampled_);
     mono = resampled_;
   }
-  int added = 0;
-  for (int i = 0; i < num_frequencies_; ++i) {
-    if (sequence_search_) {
-      tone_strength_filters_[i].ProcessSamples(mono, &strengths_, &block_sums_);
-      tone_block_buffers_[i].Append(std::span<const float>(
-          reinterpret_cast<const float*>(block_sums_.data()), 2 * block_sums_.size()));
-    } else {
-      tone_strength_filters_[i].ProcessSamples(mono, &strengths_);
+  // Scratch rows for the bank's outputs, grown only for larger blocks.
+  const int most = tone_bank_->MaxOutputs(static_cast<int>(mono.size()));
+  if (bank_strength_rows_.empty() ||
+      bank_strengths_.size() < static_cast<size_t>(most) * num_frequencies_) {
+    bank_strengths_.resize(static_cast<size_t>(most) * num_frequencies_);
+    bank_strength_rows_.resize(num_frequencies_);
+    for (int i = 0; i < num_frequencies_; ++i) {
+      bank_strength_rows_[i] = bank_strengths_.data() + static_cast<size_t>(i) * most;
     }
-    tone_strength_buffers_[i].Append(strengths_);
-    if (i == 0) added = static_cast<int>(strengths_.size());
-    CHECK_EQ(tone_strength_buffers_[i].size(), tone_strength_buffer_size_ + added);
+    if (search_supported_) {
+      bank_sums_.resize(static_cast<size_t>(most) * num_frequencies_);
+      bank_sum_rows_.resize(num_frequencies_);
+      for (int i = 0; i < num_frequencies_; ++i) {
+        bank_sum_rows_[i] = bank_sums_.data() + static_cast<size_t>(i) * most;
+      }
+    }
   }
+  const int added = tone_bank_->ProcessSamples(
+      mono, bank_strength_rows_.data(), search_supported_ ? bank_sum_rows_.data() : nullptr);
+  const int64_t end = begin_ + tone_strength_buffer_size_;
+  if (tone_strength_buffer_size_ + added > strengths_.capacity()) {
+    const int capacity = 2 * (tone_strength_buffer_size_ + added);
+    strengths_.Reserve(capacity, begin_, end);
+    columns_.Reserve(capacity, columns_begin_, columns_begin_ + columns_length_);
+  }
+  for (int i = 0; i < num_frequencies_; ++i) {
+    strengths_.Write(i, end, bank_strength_rows_[i], added);
+  }
+  if (search_supported_) TrackFrames(added);
   tone_strength_buffer_size_ += added;
 }
 
-// Delay-compensated gamma smoothing: the filter's delay d is removed by
-// priming its stages with the mean of the first d inputs, dropping the first
-// d outputs and flushing with the mean of the last d inputs, so that the
-// smoothed value at i describes the noise around i, not d samples earlier.
-void DtmfDecoder::SmoothNoise(std::vector<float>* noise) const {
-  std::vector<float>& x = *noise;
-  const int length = static_cast<int>(x.size());
-  if (length == 0) return;
-  const int order = params_.noise_estimate_filter_order;
-  const double pole = audio_dsp::GammaFilterPoleFromStddev(
-      params_.noise_estimate_filter_stddev * baseband_frame_size_, order);
-  const int d = audio_dsp::GammaFilterDelay(order, pole);
-  const auto mean = [&](int begin, int end) {
-    double sum = 0.0;
-    for (int i = begin; i < end; ++i) sum += x[i];
-    return static_cast<float>(sum / (end - begin));
-  };
-  if (length <= d) {
-    std::fill(x.begin(), x.end(), mean(0, length));
-    return;
+// The matched-filter sums of the frames completed by the newest `count`
+// block sums (see window_twiddles_).
+void DtmfDecoder::TrackFrames(int count) {
+  const int period = baseband_frame_size_;
+  const int tones = num_frequencies_;
+  const int max_frames = params_.room_search.max_frames;
+  for (int n = 0; n < count; ++n) {
+    const int64_t j = block_position_++;
+    const std::complex<double> w = window_twiddles_[j % (2 * period)];
+    for (int k = 0; k < tones; ++k) {
+      const std::complex<double> z(bank_sum_rows_[k][n]);
+      running_a_[k] += w * z;
+      running_b_[k] += std::conj(w) * z;
+    }
+    const int c = candidate_at_[(j + 1) % period];
+    if (c < 0) continue;
+    // Position j + 1 starts candidate c's next window and ends its open one.
+    const int64_t s = window_start_[c];
+    std::complex<double>* a = &window_a_[static_cast<size_t>(c) * tones];
+    std::complex<double>* b = &window_b_[static_cast<size_t>(c) * tones];
+    if (s >= 0 && s + period == j + 1) {
+      const std::complex<double> turn = start_twiddles_[s % (2 * period)];
+      const int slot = frame_next_[c];
+      std::complex<float>* out =
+          &frame_values_[(static_cast<size_t>(c) * max_frames + slot) * tones];
+      for (int k = 0; k < tones; ++k) {
+        const std::complex<double> sum =
+            (std::conj(turn) * (running_a_[k] - a[k]) - turn * (running_b_[k] - b[k])) /
+            std::complex<double>(0.0, 2.0);
+        out[k] = std::complex<float>(sum);
+      }
+      frame_starts_[static_cast<size_t>(c) * max_frames + slot] = s;
+      frame_next_[c] = (slot + 1) % max_frames;
+      frame_count_[c] = std::min(frame_count_[c] + 1, max_frames);
+    }
+    window_start_[c] = j + 1;
+    std::copy_n(running_a_.data(), tones, a);
+    std::copy_n(running_b_.data(), tones, b);
   }
-  const float head = d > 0 ? mean(0, d) : x[0];
-  const float tail = d > 0 ? mean(length - d, length) : x[length - 1];
-  audio_dsp::GammaFilter filter(order, baseband_sample_rate_, pole);
-  filter.SetState(head);
-  std::vector<float> scratch(d);
-  filter.ProcessBlock(x.data(), d, scratch.data());  // warm-up, output unused
-  filter.ProcessBlock(x.data() + d, length - d, x.data());
-  std::fill(scratch.begin(), scratch.end(), tail);
-  filter.ProcessBlock(scratch.data(), d, x.data() + (length - d));
 }
 
 // Tone normalisation and the per-column acquisition terms. A column's values
 // depend only on the raw strengths inside its max-filter window, clipped to
 // the buffer, and raw strengths never change once buffered. So the columns
-// computed by the previous call are copied where their window is unchanged
+// computed by the previous call are kept where their window is unchanged
 // (it lay inside the old buffer and still lies inside, or the front did not
 // move), and only the new tail and, after a drop, the new head are computed.
-// The result is identical to computing every column afresh.
+// The result is identical to computing every column afresh. Columns live in
+// a ring keyed by stream position, so kept columns are not moved.
 void DtmfDecoder::UpdateColumnScores() {
   const int length = tone_strength_buffer_size_;
   const int window = static_cast<int>(
       params_.tone_normalization_params.window_size * baseband_frame_size_);
   const int ahead = std::max(window - 1, 0) / 2;
-  const int begin = tone_strength_buffers_[0].num_discarded_samples();
-  const int old_begin = columns_begin_;
-  const int old_length = static_cast<int>(column_signal_.size());
+  const int64_t begin = begin_;
+  const int64_t old_begin = columns_begin_;
+  const int old_length = columns_length_;
 
   // Reusable columns, in positions of the current buffer.
   int reuse_from = 0, reuse_to = 0;
-  if (old_length > 0 && begin >= old_begin) {
-    const int shift = begin - old_begin;
+  if (old_length > 0 && begin >= old_begin && begin - old_begin <= old_length) {
+    const int shift = static_cast<int>(begin - old_begin);
     reuse_from = shift == 0 ? 0 : std::max(window - 1 - ahead, 0);
     reuse_to = std::min(old_length - shift - ahead, length);
     if (reuse_to <= reuse_from) reuse_from = reuse_to = 0;
   }
-
-  audio_dsp::RowMajorFloatMatrix scores(num_frequencies_, length);
-  std::vector<float> signal(length), noise(length);
   if (reuse_to > reuse_from) {
-    const int shift = begin - old_begin;
-    const int count = reuse_to - reuse_from;
-    for (int i = 0; i < num_frequencies_; ++i) {
-      std::copy_n(tone_scores_.row(i).data() + reuse_from + shift, count,
-                  scores.row(i).data() + reuse_from);
-    }
-    std::copy_n(column_signal_.begin() + reuse_from + shift, count, signal.begin() + reuse_from);
-    std::copy_n(column_noise_.begin() + reuse_from + shift, count, noise.begin() + reuse_from);
-    ComputeColumns(0, reuse_from, &scores, &signal, &noise);
-    ComputeColumns(reuse_to, length, &scores, &signal, &noise);
+    ComputeColumns(0, reuse_from);
+    ComputeColumns(reuse_to, length);
   } else {
-    ComputeColumns(0, length, &scores, &signal, &noise);
+    ComputeColumns(0, length);
   }
-  tone_scores_ = std::move(scores);
-  column_signal_ = std::move(signal);
-  column_noise_ = std::move(noise);
   columns_begin_ = begin;
+  columns_length_ = length;
 }
 
-// Columns [first, last) of the tone scores, and for each the acquisition's
-// signal (the weakest of the tones_per_symbol strongest tones) and unsmoothed
-// noise (the mean of the other tones).
-void DtmfDecoder::ComputeColumns(int first, int last, audio_dsp::RowMajorFloatMatrix* scores,
-                                 std::vector<float>* signal, std::vector<float>* noise) {
+// Columns [first, last) of the acquisition's signal (the weakest of the
+// tones_per_symbol strongest normalised tones) and unsmoothed noise (the
+// mean of the other tones), in chunks so that the scratch stays small.
+void DtmfDecoder::ComputeColumns(int first, int last) {
   if (first >= last) return;
   const ToneNormalizationParams& norm = params_.tone_normalization_params;
   const int length = tone_strength_buffer_size_;
   const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
   const int ahead = std::max(window - 1, 0) / 2;
-  // The raw strengths every window of these columns can reach.
-  const int from = std::max(0, first + ahead - window + 1);
-  const int to = std::min(length, last + ahead);
   const int rows = num_frequencies_;
-  const int count = last - first;
-
-  // Local level of every tone (running maximum), and the strongest of them.
-  local_.resize(rows, to - from);
-  std::vector<const float*> raw(rows);
-  for (int i = 0; i < rows; ++i) {
-    raw[i] = tone_strength_buffers_[i].View(0).data();
-    audio_dsp::MaxFilter(raw[i] + from, to - from, window, local_.row(i).data());
+  constexpr int kChunk = 1024;
+  const int span_max = kChunk + window;
+  if (chunk_raw_.size() < static_cast<size_t>(span_max) * rows) {
+    chunk_raw_.resize(static_cast<size_t>(span_max) * rows);
+    chunk_local_.resize(span_max);
+    max_scratch_.resize(2 * static_cast<size_t>(span_max));
+    chunk_levels_.resize(static_cast<size_t>(kChunk) * rows);
+    strongest_.resize(kChunk);
+    chunk_signal_.resize(kChunk);
+    chunk_noise_.resize(kChunk);
   }
-  const int offset = first - from;
-  std::vector<float> strongest(local_.row(0).data() + offset,
-                               local_.row(0).data() + offset + count);
-  for (int i = 1; i < rows; ++i) {
-    const float* levels = local_.row(i).data() + offset;
-    for (int t = 0; t < count; ++t) strongest[t] = std::max(strongest[t], levels[t]);
-  }
-  // Each tone over its level, partly levelled across tones.
-  for (int i = 0; i < rows; ++i) {
-    const float* levels = local_.row(i).data() + offset;
-    const float* strengths = raw[i] + first;
-    float* out = scores->row(i).data() + first;
-    for (int t = 0; t < count; ++t) {
-      const float level = levels[t] + norm.cross_frequency_weight * (strongest[t] - levels[t]) +
-                          norm.division_floor;
-      out[t] = strengths[t] / level;
-    }
-  }
-
-  // With few tones per symbol, keeping the strongest ones in a small sorted
-  // array is cheaper than a partial sort of every column.
   const int k = num_frequencies_ - params_.tones_per_symbol;
   const int top_count = params_.tones_per_symbol;
-  std::vector<float> top(top_count);
-  for (int t = first; t < last; ++t) {
-    std::fill(top.begin(), top.end(), -INFINITY);  // descending
-    float sum = 0.0f;
+  float* top = top_.data();
+  for (int c0 = first; c0 < last; c0 += kChunk) {
+    const int c1 = std::min(last, c0 + kChunk);
+    const int count = c1 - c0;
+    // The raw strengths every window of these columns can reach.
+    const int from = std::max(0, c0 + ahead - window + 1);
+    const int to = std::min(length, c1 + ahead);
+    const int span = to - from;
+    const int offset = c0 - from;
+    // Local level of every tone (running maximum), and the strongest.
     for (int i = 0; i < rows; ++i) {
-      const float v = (*scores)(i, t);
-      sum += v;
-      if (v > top[top_count - 1]) {
-        int j = top_count - 1;
-        for (; j > 0 && top[j - 1] < v; --j) top[j] = top[j - 1];
-        top[j] = v;
-      }
+      float* raw = chunk_raw_.data() + static_cast<size_t>(i) * span_max;
+      strengths_.Read(i, begin_ + from, span, raw);
+      audio_dsp::MaxFilter(raw, span, window, chunk_local_.data(), max_scratch_.data());
+      std::copy_n(chunk_local_.data() + offset, count, chunk_levels_.data() + i * kChunk);
     }
-    (*signal)[t] = top[top_count - 1];  // the k-th smallest value
-    float top_sum = 0.0f;
-    for (float v : top) top_sum += v;
-    (*noise)[t] = k > 0 ? (sum - top_sum) / static_cast<float>(k) : 0.0f;
+    std::copy_n(chunk_levels_.data(), count, strongest_.data());
+    for (int i = 1; i < rows; ++i) {
+      const float* levels = chunk_levels_.data() + i * kChunk;
+      for (int t = 0; t < count; ++t) strongest_[t] = std::max(strongest_[t], levels[t]);
+    }
+    // With few tones per symbol, keeping the strongest ones in a small
+    // sorted array is cheaper than a partial sort of every column.
+    for (int t = 0; t < count; ++t) {
+      std::fill(top, top + top_count, -INFINITY);  // descending
+      float sum = 0.0f;
+      for (int i = 0; i < rows; ++i) {
+        const float level = chunk_levels_[i * kChunk + t];
+        const float v =
+            chunk_raw_[static_cast<size_t>(i) * span_max + offset + t] /
+            (level + norm.cross_frequency_weight * (strongest_[t] - level) + norm.division_floor);
+        sum += v;
+        if (v > top[top_count - 1]) {
+          int j = top_count - 1;
+          for (; j > 0 && top[j - 1] < v; --j) top[j] = top[j - 1];
+          top[j] = v;
+        }
+      }
+      float top_sum = 0.0f;
+      for (int j = 0; j < top_count; ++j) top_sum += top[j];
+      chunk_signal_[t] = top[top_count - 1];  // the k-th smallest value
+      chunk_noise_[t] = k > 0 ? (sum - top_sum) / static_cast<float>(k) : 0.0f;
+    }
+    columns_.Write(0, begin_ + c0, chunk_signal_.data(), count);
+    columns_.Write(1, begin_ + c0, chunk_noise_.data(), count);
+  }
+}
+
+// The normalised scores of every tone at buffer column t: the local levels
+// are the maxima over the column's clipped window, read directly.
+void DtmfDecoder::ToneScoresAt(int t) {
+  const ToneNormalizationParams& norm = params_.tone_normalization_params;
+  const int length = tone_strength_buffer_size_;
+  const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
+  const int ahead = std::max(window - 1, 0) / 2;
+  const int lo = std::max(0, t + ahead - window + 1);
+  const int hi = std::min(length - 1, t + ahead);
+  float strongest = -INFINITY;
+  for (int i = 0; i < num_frequencies_; ++i) {
+    const auto [a, b] = strengths_.Pieces(i, begin_ + lo, hi - lo + 1);
+    float level = -INFINITY;
+    for (const std::span<const float> piece : {a, b}) {
+      size_t j = 0;
+      if (piece.size() >= 4) {
+        audio_dsp::Float4 m = audio_dsp::Load4(piece.data());
+        for (j = 4; j + 4 <= piece.size(); j += 4) {
+          m = audio_dsp::Max4(m, audio_dsp::Load4(piece.data() + j));
+        }
+        level = std::max(level, audio_dsp::MaxLane4(m));
+      }
+      for (; j < piece.size(); ++j) level = std::max(level, piece[j]);
+    }
+    column_scores_[i] = level;
+    strongest = std::max(strongest, level);
+  }
+  for (int i = 0; i < num_frequencies_; ++i) {
+    const float level = column_scores_[i];
+    column_scores_[i] = strengths_.at(i, begin_ + t) /
+                        (level + norm.cross_frequency_weight * (strongest - level) +
+                         norm.division_floor);
   }
 }
 
@@ -359,24 +495,34 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   if (length == 0) return false;
 
   UpdateColumnScores();
-  const audio_dsp::RowMajorFloatMatrix& tone_scores = tone_scores_;
-  CHECK(tone_scores.rows() == num_frequencies_);
-  CHECK(tone_scores.cols() == tone_strength_buffer_size_);
-  std::vector<float> noise = column_noise_;
-  SmoothNoise(&noise);
-  std::vector<float> acquisition_scores(length);
-  for (int t = 0; t < length; ++t) {
-    acquisition_scores[t] = column_signal_[t] / (1e-12f + noise[t]);
+  // Smoothed noise, then the acquisition scores in place.
+  acquisition_.resize(length);
+  const auto [noise_a, noise_b] = columns_.Pieces(1, begin_, length);
+  if (params_.use_reference_paths) {
+    smoother_->SmoothReference(noise_a, noise_b, acquisition_.data());
+  } else {
+    smoother_->Smooth(noise_a, noise_b, acquisition_.data());
   }
+  {
+    const auto [signal_a, signal_b] = columns_.Pieces(0, begin_, length);
+    float* acquisition = acquisition_.data();
+    for (const std::span<const float> piece : {signal_a, signal_b}) {
+      for (float signal : piece) {
+        *acquisition = signal / (1e-12f + *acquisition);
+        ++acquisition;
+      }
+    }
+  }
+  const std::vector<float>& acquisition_scores = acquisition_;
 
   // Symbol timing: the phase of the acquisition folded over whole periods.
   const int period = baseband_frame_size_;
-  std::vector<double> folded(period, 0.0);
-  for (int p = 0; p < (length / period) * period; ++p) folded[p % period] += acquisition_scores[p];
+  std::fill(folded_.begin(), folded_.end(), 0.0);
+  for (int p = 0; p < (length / period) * period; ++p) folded_[p % period] += acquisition_scores[p];
   const std::complex<double> step = std::polar(1.0, 2.0 * std::numbers::pi / period);
   std::complex<double> phasor(1.0, 0.0), sum;
   for (int p = 0; p < period; ++p) {
-    sum += folded[p] * phasor;
+    sum += folded_[p] * phasor;
     phasor *= step;
   }
   const double angle = std::atan2(sum.imag(), sum.real());
@@ -386,8 +532,7 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   // Per-symbol scores at every symbol-spaced time with enough acquisition.
   CHECK(acquisition_scores.size() == static_cast<size_t>(tone_strength_buffer_size_));
   const int alphabet = static_cast<int>(params_.symbol_table.size());
-  const float discarded_seconds =
-      static_cast<float>(tone_strength_buffers_[0].num_discarded_samples()) / baseband_sample_rate_;
+  const float discarded_seconds = static_cast<float>(begin_) / baseband_sample_rate_;
   for (int slot = 0, t = t0; t < length; ++slot, t += period) {
     float score = acquisition_scores[t];
     if (t > period && t + period < length) {
@@ -395,10 +540,11 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
                                        acquisition_scores[t + period]));
     }
     if (score < params_.acquisition_threshold) continue;
+    ToneScoresAt(t);
     audio_dsp::FloatVector symbol_scores(alphabet);
     for (int s = 0; s < alphabet; ++s) {
       float weakest = INFINITY;
-      for (int tone : params_.symbol_table[s]) weakest = std::min(weakest, tone_scores(tone, t));
+      for (int tone : params_.symbol_table[s]) weakest = std::min(weakest, column_scores_[tone]);
       symbol_scores[s] = weakest;
     }
     decode_results->symbol_scores.emplace(slot, std::move(symbol_scores));
@@ -422,44 +568,50 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
 
 namespace audio_sorvane {
 
-// Frame n's window starts at buffer index first + n * P. The block sums
+// The frames of one timing candidate come from TrackFrames. The block sums
 // carry the receiver oscillator's phase, which advances by a tone-dependent
 // amount from frame to frame while every transmitted frame starts at phase
 // 0; turning each frame back by the oscillator phase at its start leaves
 // one constant phase per tone, which the room taps absorb.
-void DtmfDecoder::FrameAmplitudes(int first, int count, audio_dsp::ComplexMatrix* frames) const {
-  const int period = baseband_frame_size_;
-  const uint32_t begin =
-      static_cast<uint32_t>(tone_strength_buffers_[0].num_discarded_samples());
-  frames->resize(count, num_frequencies_);
-  for (int k = 0; k < num_frequencies_; ++k) {
-    const float* z = tone_block_buffers_[k].View(0).data();
-    for (int n = 0; n < count; ++n) {
-      const int start = first + n * period;
-      float re = 0.0f, im = 0.0f;
-      for (int m = 0; m < period; ++m) {
-        re += frame_window_[m] * z[2 * (start + m)];
-        im += frame_window_[m] * z[2 * (start + m) + 1];
-      }
-      const uint32_t phase = (begin + static_cast<uint32_t>(start)) * frame_phase_steps_[k];
+int DtmfDecoder::FrameAmplitudes(int candidate, int64_t earliest,
+                                 audio_dsp::ComplexMatrix* frames) const {
+  const int max_frames = params_.room_search.max_frames;
+  const int tones = num_frequencies_;
+  const int held = frame_count_[candidate];
+  // The held frames, oldest first, from the ring.
+  const int oldest = (frame_next_[candidate] - held + max_frames) % max_frames;
+  int skip = 0;
+  while (skip < held &&
+         frame_starts_[static_cast<size_t>(candidate) * max_frames + (oldest + skip) % max_frames] <
+             earliest) {
+    ++skip;
+  }
+  const int count = held - skip;
+  frames->resize(count, tones);
+  for (int n = 0; n < count; ++n) {
+    const int slot = (oldest + skip + n) % max_frames;
+    const int64_t start = frame_starts_[static_cast<size_t>(candidate) * max_frames + slot];
+    const std::complex<float>* values =
+        &frame_values_[(static_cast<size_t>(candidate) * max_frames + slot) * tones];
+    for (int k = 0; k < tones; ++k) {
+      const uint32_t phase = static_cast<uint32_t>(start) * frame_phase_steps_[k];
       const double angle = -2.0 * std::numbers::pi * (phase / 4294967296.0);
-      (*frames)(n, k) = std::complex<float>(re, im) *
-                        std::complex<float>(static_cast<float>(std::cos(angle)),
-                                            static_cast<float>(std::sin(angle)));
+      (*frames)(n, k) = values[k] * std::complex<float>(static_cast<float>(std::cos(angle)),
+                                                        static_cast<float>(std::sin(angle)));
     }
   }
+  return count;
 }
 
 bool DtmfDecoder::LoopRepeats(int first, int count) const {
   const int frame = baseband_frame_size_;
-  const int loop = sequence_search_->params().period;
+  const int loop = search_params_.period;
   double xy = 0.0, xx = 0.0, yy = 0.0;
   std::vector<double> x(count);
   for (int k = 0; k < num_frequencies_; ++k) {
-    const std::span<const float> strengths = tone_strength_buffers_[k].View(0);
     double mean = 0.0;
     for (int n = 0; n < count; ++n) {
-      x[n] = strengths[first + n * frame + frame / 2];
+      x[n] = strengths_.at(k, begin_ + first + n * frame + frame / 2);
       mean += x[n];
     }
     mean /= count;
@@ -476,7 +628,7 @@ bool DtmfDecoder::LoopRepeats(int first, int count) const {
 
 bool DtmfDecoder::TokenFromMasks(const std::vector<uint32_t>& tone_masks,
                                  DecodedToken* token) const {
-  const int period = sequence_search_->params().period;
+  const int period = search_params_.period;
   std::vector<int> loop(period);
   int spacer_at = -1;
   for (int p = 0; p < period; ++p) {
@@ -516,13 +668,14 @@ bool DtmfDecoder::GetReverberantToken(DecodeResults* decode_results) {
   }
   CHECK(decode_results);
   decode_results->Clear();
-  if (!sequence_search_) return false;
+  if (!search_supported_) return false;
   const RoomSearchParams& room = params_.room_search;
   const int frame = baseband_frame_size_;
   const int length = tone_strength_buffer_size_;
-  const int begin = tone_strength_buffers_[0].num_discarded_samples();
-  const int earliest = std::max(0, room.settle_frames * frame - begin);
-  const int loop = sequence_search_->params().period;
+  const int64_t begin = begin_;
+  const int earliest =
+      static_cast<int>(std::max<int64_t>(0, int64_t{room.settle_frames} * frame - begin));
+  const int loop = search_params_.period;
   // Once per frame of new audio, and only for audio that repeats.
   const int64_t end = static_cast<int64_t>(begin) + length;
   if (last_search_end_ >= 0 && end - last_search_end_ < frame) return false;
@@ -538,16 +691,12 @@ bool DtmfDecoder::GetReverberantToken(DecodeResults* decode_results) {
   };
   std::vector<Fit> fits;
   audio_dsp::ComplexMatrix frames;
+  if (!sequence_search_) sequence_search_ = std::make_unique<ToneSequenceSearch>(search_params_);
   for (int c = 0; c < room.timing_candidates; ++c) {
-    const int offset = c * frame / room.timing_candidates;
-    int first = earliest + audio_dsp::PositiveModulo(offset - (begin + earliest), frame);
-    int count = std::max(length - first, 0) / frame;
-    if (count > room.max_frames) {
-      first += (count - room.max_frames) * frame;
-      count = room.max_frames;
-    }
+    // The newest whole frames of this timing inside the buffer, past the
+    // settling frames (TrackFrames keeps at most max_frames of them).
+    const int count = FrameAmplitudes(c, begin + earliest, &frames);
     if (count < 2 * loop) continue;
-    FrameAmplitudes(first, count, &frames);
     Fit fit;
     if (!sequence_search_->Search(frames, &fit.masks, &fit.cost)) continue;
     const double energy = frames.cwiseAbs2().sum();

@@ -20,16 +20,18 @@
 #include <memory>
 #include <span>
 #include <unordered_map>
+#include <utility>
 #include <vector>
 
 #include "audio/dsp/eigen_types.h"
 #include "audio/dsp/rational_factor_resampler.h"
 #include "audio/sorvane/dtmf/byte_symbol_converter.h"
 #include "audio/sorvane/dtmf/dtmf_encoder_params.h"
+#include "audio/sorvane/dtmf/noise_smoother.h"
 #include "audio/sorvane/dtmf/tone_sequence_search.h"
 #include "audio/sorvane/dtmf/tone_strength_filter.h"
 #include "audio/sorvane/sorvane_decoder.h"
-#include "audio/sorvane/stream_buffer.h"
+
 #include "audio/sorvane/token_selector.h"
 
 namespace audio_sorvane {
@@ -95,6 +97,38 @@ struct DtmfDecoderParams : DtmfEncoderParams {
   int max_candidates_per_decode_token_call = 2;
   float token_threshold_factor = 1.0f / 3.0f;
   RoomSearchParams room_search;
+  // Runs the tone filters and the noise smoother in their direct reference
+  // forms (ToneStrengthFilter::ProcessSamplesReference,
+  // AlignedGammaSmoother::SmoothReference) instead of the fast ones; for
+  // tests.
+  bool use_reference_paths = false;
+};
+
+// Per-column values of the tone buffers, rows x capacity floats keyed by
+// stream position (position mod capacity): appending and dropping move
+// nothing. Grows (keeping a given range) only when asked for more room.
+class ColumnRing {
+ public:
+  void Init(int rows, int capacity);
+  // Makes room for `capacity` positions, keeping [from, to).
+  void Reserve(int capacity, int64_t from, int64_t to);
+  int capacity() const { return capacity_; }
+  float& at(int row, int64_t position) {
+    return data_[static_cast<size_t>(row) * capacity_ + static_cast<size_t>(position % capacity_)];
+  }
+  float at(int row, int64_t position) const {
+    return data_[static_cast<size_t>(row) * capacity_ + static_cast<size_t>(position % capacity_)];
+  }
+  void Write(int row, int64_t position, const float* values, int count);
+  void Read(int row, int64_t position, int count, float* values) const;
+  // [position, position + count) of a row as up to two contiguous pieces.
+  std::pair<std::span<const float>, std::span<const float>> Pieces(int row, int64_t position,
+                                                                    int count) const;
+
+ private:
+  int rows_ = 0;
+  int capacity_ = 0;
+  std::vector<float> data_;
 };
 
 class DtmfDecoder {
@@ -130,16 +164,21 @@ class DtmfDecoder {
   int baseband_frame_size() const { return baseband_frame_size_; }
 
  private:
-  // Aligns the gamma-smoothed sequence with its input (see the .cc).
-  void SmoothNoise(std::vector<float>* noise) const;
-  // Brings tone_scores_, column_signal_ and column_noise_ up to date with
-  // the buffers, computing only the columns that changed (see the .cc).
+  // Brings the per-column signal and noise up to date with the buffers,
+  // computing only the columns that changed (see the .cc).
   void UpdateColumnScores();
-  void ComputeColumns(int first, int last, audio_dsp::RowMajorFloatMatrix* scores,
-                      std::vector<float>* signal, std::vector<float>* noise);
-  // Matched-filter outputs of `count` frames starting at buffer index
-  // `first`, one row per frame, phase-aligned across frames.
-  void FrameAmplitudes(int first, int count, audio_dsp::ComplexMatrix* frames) const;
+  void ComputeColumns(int first, int last);
+  // The normalised tone scores of buffer column t, into column_scores_.
+  void ToneScoresAt(int t);
+  // Running windowed sums of the block sums for the coherent path: the
+  // matched-filter output of every frame of every timing candidate, as it
+  // completes.
+  void TrackFrames(int count);
+  // Matched-filter outputs of the newest `count` frames (at most
+  // max_frames) of timing candidate `candidate` starting at or after stream
+  // position `earliest`, one row per frame, phase-aligned across frames.
+  // Returns the number of frames.
+  int FrameAmplitudes(int candidate, int64_t earliest, audio_dsp::ComplexMatrix* frames) const;
   // Whether the tone strengths of the newest frames, sampled mid-frame and
   // centred per tone, correlate with those one loop later.
   bool LoopRepeats(int first, int count) const;
@@ -161,29 +200,57 @@ class DtmfDecoder {
   int max_good_block_size_ = 0;
   int max_buffer_size_ = 0;
   std::unique_ptr<audio_dsp::RationalFactorResampler<float>> received_resampler_;
-  std::vector<ToneStrengthFilter> tone_strength_filters_;
-  std::vector<StreamBuffer> tone_strength_buffers_;
+  std::unique_ptr<ToneFilterBank> tone_bank_;
+  // Raw tone strengths, one row per tone, for stream positions
+  // [begin_, begin_ + tone_strength_buffer_size_).
+  ColumnRing strengths_;
+  int64_t begin_ = 0;
   int tone_strength_buffer_size_ = 0;
   bool initialized_ = false;
 
-  std::vector<float> mono_, resampled_, strengths_;  // scratch
+  std::vector<float> mono_, resampled_;  // scratch
+  std::vector<float> bank_strengths_;    // scratch, one row per tone
+  std::vector<float*> bank_strength_rows_;
+  std::vector<std::complex<float>> bank_sums_;  // scratch, one row per tone
+  std::vector<std::complex<float>*> bank_sum_rows_;
 
-  // Coherent path: per tone the raw block sums (interleaved real,
-  // imaginary), kept in step with tone_strength_buffers_.
-  std::vector<StreamBuffer> tone_block_buffers_;
-  std::vector<std::complex<float>> block_sums_;  // scratch
-  std::vector<uint32_t> frame_phase_steps_;      // oscillator turn per frame, 2^-32
-  std::vector<float> frame_window_;              // per baseband sample of a frame
+  // Coherent path (room search).
+  bool search_supported_ = false;
+  ToneSequenceSearchParams search_params_;
+  std::vector<uint32_t> frame_phase_steps_;  // oscillator turn per frame, 2^-32
   std::unordered_map<uint32_t, int> symbol_of_tones_;  // tone bit set -> symbol
-  std::unique_ptr<ToneSequenceSearch> sequence_search_;
+  std::unique_ptr<ToneSequenceSearch> sequence_search_;  // built on first use
   int64_t last_search_end_ = -1;  // stream position of the last gate check
+  // Frame windows: w[m] = sin(pi (m + 0.5) / P) = Im e^{i phi (m + 0.5)}
+  // with phi = pi / P, so a window's sum over [s, s + P) is
+  // (e^{-i phi s} A - e^{i phi s} B) / 2i with A, B the sums of
+  // e^{+-i phi (j + 0.5)} z_j over the window: running sums per tone (in
+  // double) differenced at the window ends.
+  std::vector<std::complex<double>> window_twiddles_;  // e^{i phi (j + 0.5)}, j < 2P
+  std::vector<std::complex<double>> start_twiddles_;   // e^{i phi j}, j < 2P
+  std::vector<std::complex<double>> running_a_, running_b_;  // per tone
+  std::vector<std::complex<double>> window_a_, window_b_;    // per candidate x tone
+  std::vector<int64_t> window_start_;   // per candidate: start of the open window, or -1
+  std::vector<int> candidate_at_;       // per (position + 1) mod P: candidate ending there, or -1
+  std::vector<int> candidate_offset_;   // per candidate
+  // Per candidate the newest max_frames frames (unrotated), a ring.
+  std::vector<std::complex<float>> frame_values_;  // candidate x max_frames x tones
+  std::vector<int64_t> frame_starts_;              // candidate x max_frames
+  std::vector<int> frame_count_, frame_next_;
+  int64_t block_position_ = 0;  // stream position of the next block sum
 
-  // Per-column results of the last GetToken, for the columns of the buffers
-  // as they were then, starting at stream index columns_begin_.
-  audio_dsp::RowMajorFloatMatrix tone_scores_;
-  std::vector<float> column_signal_, column_noise_;
-  int columns_begin_ = 0;
-  audio_dsp::RowMajorFloatMatrix local_;  // scratch
+  // Per-column acquisition terms of the last GetToken (signal row 0, noise
+  // row 1), for stream positions [columns_begin_, columns_begin_ +
+  // columns_length_).
+  ColumnRing columns_;
+  int64_t columns_begin_ = 0;
+  int columns_length_ = 0;
+  std::unique_ptr<AlignedGammaSmoother> smoother_;
+  // Scratch, sized once.
+  std::vector<float> chunk_raw_, chunk_local_, chunk_levels_, max_scratch_, strongest_;
+  std::vector<float> chunk_signal_, chunk_noise_;
+  std::vector<float> column_scores_, top_, acquisition_;
+  std::vector<double> folded_;
 };
 
 }  // namespace audio_sorvane

@@ -1,0 +1,179 @@
+#include "audio/sorvane/dtmf/noise_smoother.h"
+
+#include <algorithm>
+#include <cmath>
+
+#include "audio/dsp/float4.h"
+#include "audio/dsp/gamma_filter.h"
+#include "base/logging.h"
+
+namespace audio_sorvane {
+
+using audio_dsp::Float4;
+using audio_dsp::Load4;
+using audio_dsp::Splat4;
+using audio_dsp::Store4;
+
+AlignedGammaSmoother::AlignedGammaSmoother(int order, double sample_rate, double pole)
+    : order_(order),
+      sample_rate_(sample_rate),
+      pole_(pole),
+      gain_(static_cast<float>(1.0 - pole)),
+      delay_(audio_dsp::GammaFilterDelay(order, pole)) {
+  CHECK(order >= 1);
+  CHECK(sample_rate > 0.0);
+}
+
+namespace {
+
+// The mean of pieces [begin, end) of first ++ second, in double.
+float Mean(std::span<const float> first, std::span<const float> second, int begin, int end) {
+  const int n1 = static_cast<int>(first.size());
+  double sum = 0.0;
+  for (int i = begin; i < end; ++i) sum += i < n1 ? first[i] : second[i - n1];
+  return static_cast<float>(sum / (end - begin));
+}
+
+}  // namespace
+
+void AlignedGammaSmoother::SmoothReference(std::span<const float> first,
+                                           std::span<const float> second, float* output) const {
+  const int length = static_cast<int>(first.size() + second.size());
+  if (length == 0) return;
+  std::vector<float> x(first.begin(), first.end());
+  x.insert(x.end(), second.begin(), second.end());
+  const int d = delay_;
+  if (length <= d) {
+    std::fill(output, output + length, Mean(first, second, 0, length));
+    return;
+  }
+  const float head = d > 0 ? Mean(first, second, 0, d) : x[0];
+  const float tail = d > 0 ? Mean(first, second, length - d, length) : x[length - 1];
+  audio_dsp::GammaFilter filter(order_, sample_rate_, pole_);
+  filter.SetState(head);
+  std::vector<float> scratch(d);
+  filter.ProcessBlock(x.data(), d, scratch.data());  // warm-up, output unused
+  filter.ProcessBlock(x.data() + d, length - d, output);
+  std::fill(scratch.begin(), scratch.end(), tail);
+  filter.ProcessBlock(scratch.data(), d, output + (length - d));
+}
+
+void AlignedGammaSmoother::EnsureTables(int length) {
+  if (length <= table_length_) return;
+  table_length_ = length;
+  coefficients_.assign(static_cast<size_t>(order_) * length, 0.0f);
+  const double g = 1.0 - pole_;
+  double pn = 1.0;
+  for (int n = 1; n <= length; ++n) {
+    pn *= pole_;
+    double b = 1.0;  // C(n + m - 1, m) g^m
+    for (int m = 0; m < order_; ++m) {
+      if (m > 0) b *= (n + m - 1) * g / m;
+      coefficients_[static_cast<size_t>(m) * length + n - 1] = static_cast<float>(pn * b);
+    }
+  }
+}
+
+void AlignedGammaSmoother::Smooth(std::span<const float> first, std::span<const float> second,
+                                  float* output) {
+  const int n1 = static_cast<int>(first.size());
+  const int length = static_cast<int>(first.size() + second.size());
+  if (length == 0) return;
+  const int d = delay_;
+  if (order_ > kMaxOrder) return SmoothReference(first, second, output);
+  if (length <= d) {
+    std::fill(output, output + length, Mean(first, second, 0, length));
+    return;
+  }
+  const float head = d > 0 ? Mean(first, second, 0, d) : (n1 > 0 ? first[0] : second[0]);
+  const float tail = d > 0 ? Mean(first, second, length - d, length)
+                           : (length > n1 ? second[length - n1 - 1] : first[length - 1]);
+  // The input u = x ++ (d times tail); y[j] (j >= d) goes to output[j - d].
+  const int total = length + d;
+  const int segment = (total + kLanes - 1) / kLanes;
+  EnsureTables(segment);
+  const int order = order_;
+  const Float4 gain = Splat4(gain_);
+
+  // Zero-state runs, one segment per lane (lane 0 primed with head).
+  Float4 state[kMaxOrder][2];
+  for (int k = 0; k < order; ++k) {
+    state[k][0] = Float4{head, 0.0f, 0.0f, 0.0f};
+    state[k][1] = Splat4(0.0f);
+  }
+  float final_state[kLanes][kMaxOrder] = {};
+  // The padded input and the full output (y[j] at j), contiguous.
+  const int padded = kLanes * segment;
+  if (input_.size() < static_cast<size_t>(padded)) {
+    input_.resize(padded);
+    full_.resize(padded);
+  }
+  std::copy(first.begin(), first.end(), input_.begin());
+  std::copy(second.begin(), second.end(), input_.begin() + n1);
+  std::fill(input_.begin() + length, input_.begin() + padded, tail);
+  int lane_length[kLanes];
+  for (int q = 0; q < kLanes; ++q) lane_length[q] = std::clamp(total - q * segment, 0, segment);
+  for (int i = 0; i < segment; ++i) {
+    const float* x = input_.data() + i;
+    Float4 in[2] = {Float4{x[0], x[segment], x[2 * segment], x[3 * segment]},
+                    Float4{x[4 * segment], x[5 * segment], x[6 * segment], x[7 * segment]}};
+    for (int k = 0; k < order; ++k) {
+      for (int h = 0; h < 2; ++h) {
+        state[k][h] += gain * (in[h] - state[k][h]);
+        in[h] = state[k][h];
+      }
+    }
+    for (int q = 0; q < kLanes; ++q) full_[q * segment + i] = in[q / 4][q % 4];
+    for (int q = 0; q < kLanes; ++q) {
+      if (i == lane_length[q] - 1) {
+        for (int k = 0; k < order; ++k) final_state[q][k] = state[k][q / 4][q % 4];
+      }
+    }
+  }
+
+  // Free responses: the true state entering segment q is the previous
+  // segment's zero-state end plus the free response of its own entry state.
+  const float* c = coefficients_.data();
+  const int t = table_length_;
+  float entry[kMaxOrder] = {};  // the true state entering segment q
+  for (int q = 1; q < kLanes; ++q) {
+    const int start = q * segment;
+    if (start >= total) break;
+    const int previous = segment;  // segments before the last are full
+    float next[kMaxOrder];
+    for (int k = 0; k < order; ++k) {
+      float free = 0.0f;
+      if (q > 1) {
+        for (int m = 0; m <= k; ++m) free += c[m * t + previous - 1] * entry[k - m];
+      }
+      next[k] = final_state[q - 1][k] + free;
+    }
+    std::copy(next, next + order, entry);
+    // Output j = start + n - 1 gets sum_m c_m(n) entry[order - 1 - m].
+    const int end = std::min(total, start + segment);
+    int j = std::max(start, d);
+    for (; j < end && (j - start) % 4 != 0; ++j) {
+      const int n = j - start + 1;
+      float free = 0.0f;
+      for (int m = 0; m < order; ++m) free += c[m * t + n - 1] * entry[order - 1 - m];
+      full_[j] += free;
+    }
+    for (; j + 4 <= end; j += 4) {
+      const int n = j - start + 1;
+      Float4 free = Splat4(0.0f);
+      for (int m = 0; m < order; ++m) {
+        free += Load4(c + m * t + n - 1) * Splat4(entry[order - 1 - m]);
+      }
+      Store4(&full_[j], Load4(&full_[j]) + free);
+    }
+    for (; j < end; ++j) {
+      const int n = j - start + 1;
+      float free = 0.0f;
+      for (int m = 0; m < order; ++m) free += c[m * t + n - 1] * entry[order - 1 - m];
+      full_[j] += free;
+    }
+  }
+  std::copy(full_.begin() + d, full_.begin() + total, output);
+}
+
+}  // namespace audio_sorvane
