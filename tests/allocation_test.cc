@@ -139,6 +139,7 @@ TEST(AllocationTest, SteadyStreamingAndRequestsAllocateNothing) {
          return MakeDsssDecoder(config);
        },
        false},
+      {"dtmf", [] { return MakeDtmfDecoder({}); }, true},
   };
   for (const Kind& kind : kinds) {
     SCOPED_TRACE(kind.name);

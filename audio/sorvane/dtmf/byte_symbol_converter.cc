@@ -38,21 +38,37 @@ std::vector<int> ByteSymbolConverter::BytesToSymbols(
 
 std::vector<uint8_t> ByteSymbolConverter::SymbolsToBytes(
     const std::vector<int>& symbols) const {
+  std::vector<uint8_t> bytes;
+  SymbolsToBytes(symbols, &bytes);
+  return bytes;
+}
+
+void ByteSymbolConverter::SymbolsToBytes(const std::vector<int>& symbols,
+                                         std::vector<uint8_t>* bytes) const {
+  CHECK(bytes);
   CHECK(static_cast<int>(symbols.size()) == symbols_in_token_);
-  std::vector<int> digits;
-  digits.reserve(symbols.size());
   for (int symbol : symbols) {
     CHECK(symbol >= 0);
     CHECK(symbol < alphabet_size_);
     CHECK(symbol != spacer_symbol_);
-    digits.push_back(symbol > spacer_symbol_ ? symbol - 1 : symbol);
   }
-  std::vector<int> byte_digits =
-      audio_dsp::DigitSequence(std::move(digits), digit_base_).ConvertToBase(256).digits();
-  if (static_cast<int>(byte_digits.size()) < bytes_in_token_) {
-    byte_digits.resize(bytes_in_token_, 0);
+  // Horner's scheme from the most significant digit, carrying in base 256:
+  // the number's bytes, least significant first, without high-order zeros.
+  bytes->reserve(std::max<size_t>(symbols.size() + 1, bytes_in_token_));
+  bytes->assign(1, 0);
+  for (auto it = symbols.rbegin(); it != symbols.rend(); ++it) {
+    int carry = *it > spacer_symbol_ ? *it - 1 : *it;
+    for (uint8_t& byte : *bytes) {
+      const int t = byte * digit_base_ + carry;
+      byte = static_cast<uint8_t>(t & 255);
+      carry = t >> 8;
+    }
+    while (carry > 0) {
+      bytes->push_back(static_cast<uint8_t>(carry & 255));
+      carry >>= 8;
+    }
   }
-  return std::vector<uint8_t>(byte_digits.begin(), byte_digits.end());
+  if (static_cast<int>(bytes->size()) < bytes_in_token_) bytes->resize(bytes_in_token_, 0);
 }
 
 }  // namespace audio_sorvane

@@ -22,6 +22,9 @@ class ByteSymbolConverter {
   // At least bytes_in_token bytes; more when the symbols' value does not fit
   // a token (callers detect that by the length).
   std::vector<uint8_t> SymbolsToBytes(const std::vector<int>& symbols) const;
+  // The same into `bytes`, reusing its storage (no allocation once it has
+  // held a token).
+  void SymbolsToBytes(const std::vector<int>& symbols, std::vector<uint8_t>* bytes) const;
 
   int symbols_in_token() const { return symbols_in_token_; }
   int bytes_in_token() const { return bytes_in_token_; }

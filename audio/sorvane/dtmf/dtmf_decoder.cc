@@ -490,9 +490,16 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
     return false;
   }
   CHECK(decode_results);
-  decode_results->Clear();
+  decode_results->ClearDiagnostics();
+  // Candidates and the table are overwritten in place; an empty answer keeps
+  // their storage for later requests.
+  const auto nothing = [&] {
+    token_selector_->ReleaseCandidates(&decode_results->tokens);
+    decode_results->scores_table.setZero();
+    return false;
+  };
   const int length = tone_strength_buffer_size_;
-  if (length == 0) return false;
+  if (length == 0) return nothing();
 
   UpdateColumnScores();
   // Smoothed noise, then the acquisition scores in place.
@@ -541,27 +548,36 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
     }
     if (score < params_.acquisition_threshold) continue;
     ToneScoresAt(t);
-    audio_dsp::FloatVector symbol_scores(alphabet);
+    slot_scores_.resize(alphabet);
     for (int s = 0; s < alphabet; ++s) {
       float weakest = INFINITY;
       for (int tone : params_.symbol_table[s]) weakest = std::min(weakest, column_scores_[tone]);
-      symbol_scores[s] = weakest;
+      slot_scores_[s] = weakest;
     }
-    decode_results->symbol_scores.emplace(slot, std::move(symbol_scores));
+    decode_results->symbol_scores.try_emplace(slot, slot_scores_);
     decode_results->detection_times.push_back(discarded_seconds + t / baseband_sample_rate_);
     decode_results->detection_scores.push_back(score);
   }
 
-  std::vector<DecodedToken> candidates;
+  // The selector fills the candidate list in place; those of the right
+  // length are kept, in order.
+  std::vector<DecodedToken>& candidates = decode_results->tokens;
   token_selector_->SelectTokens(decode_results->symbol_scores, &decode_results->scores_table,
                                 &candidates);
-  for (DecodedToken& candidate : candidates) {
-    candidate.bytes = converter_.SymbolsToBytes(candidate.symbols);
-    if (static_cast<int>(candidate.bytes.size()) == params_.bytes_in_token) {
-      decode_results->tokens.push_back(std::move(candidate));
-    }
+  size_t kept = 0;
+  for (size_t i = 0; i < candidates.size(); ++i) {
+    converter_.SymbolsToBytes(candidates[i].symbols, &candidates[i].bytes);
+    if (static_cast<int>(candidates[i].bytes.size()) != params_.bytes_in_token) continue;
+    if (kept != i) std::swap(candidates[kept], candidates[i]);
+    ++kept;
   }
-  return !decode_results->tokens.empty();
+  rejected_.clear();
+  while (candidates.size() > kept) {
+    rejected_.push_back(std::move(candidates.back()));
+    candidates.pop_back();
+  }
+  token_selector_->ReleaseCandidates(&rejected_);
+  return !candidates.empty();
 }
 
 }  // namespace audio_sorvane
@@ -607,7 +623,8 @@ bool DtmfDecoder::LoopRepeats(int first, int count) const {
   const int frame = baseband_frame_size_;
   const int loop = search_params_.period;
   double xy = 0.0, xx = 0.0, yy = 0.0;
-  std::vector<double> x(count);
+  std::vector<double>& x = repeat_scratch_;
+  x.resize(count);
   for (int k = 0; k < num_frequencies_; ++k) {
     double mean = 0.0;
     for (int n = 0; n < count; ++n) {
@@ -667,7 +684,9 @@ bool DtmfDecoder::GetReverberantToken(DecodeResults* decode_results) {
     return false;
   }
   CHECK(decode_results);
-  decode_results->Clear();
+  // Storage of earlier answers stays for later requests.
+  token_selector_->ReleaseCandidates(&decode_results->tokens);
+  decode_results->ClearDiagnostics();
   if (!search_supported_) return false;
   const RoomSearchParams& room = params_.room_search;
   const int frame = baseband_frame_size_;

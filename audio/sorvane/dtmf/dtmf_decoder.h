@@ -250,6 +250,9 @@ class DtmfDecoder {
   std::vector<float> chunk_raw_, chunk_local_, chunk_levels_, max_scratch_, strongest_;
   std::vector<float> chunk_signal_, chunk_noise_;
   std::vector<float> column_scores_, top_, acquisition_;
+  audio_dsp::FloatVector slot_scores_;    // one slot's symbol scores
+  std::vector<DecodedToken> rejected_;    // candidates of the wrong length
+  mutable std::vector<double> repeat_scratch_;  // LoopRepeats' strengths
   std::vector<double> folded_;
 };
 
