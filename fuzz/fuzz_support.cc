@@ -37,10 +37,13 @@ float Level(uint8_t b, float lo, float hi, float fallback) {
   return b == 0 ? fallback : lo + (hi - lo) * static_cast<float>(b - 1) / 254.0f;
 }
 
-// Samples per DSSS frame above which the multiplier of the upsampling
-// factor is cut down: the decoder's tables grow with the frame, and a
-// 2047-chip code at 96 samples per chip would make each run take seconds.
+// Bounds on the DSSS frame (samples per frame, and that times the alphabet)
+// above which the upsampling multiple, the decimation and then the code
+// length are cut down. The coder renders a template per symbol and the
+// decoder's tables grow with the frame: a 2047-chip code at 96 samples per
+// chip, or 257 symbols of 8192 samples, makes each run take a second.
 constexpr int kMaxSamplesPerFrame = 8192;
+constexpr int kMaxTemplateSamples = 1 << 17;
 
 }  // namespace
 
@@ -57,12 +60,19 @@ DsssDecoderConfig ReadDsssSettings(FuzzInput& in, bool hotsound) {
       in.Pick(0, audio_sorvane::NumCodesForTaps(coder.number_of_taps) - 1, 0);
   coder.baseband_decimation_factor = in.Pick(1, 8, 3);
   int multiple = in.Pick(1, 12, 5);
-  const int chips = (1 << coder.number_of_taps) - 1;
-  multiple = std::max(1, std::min(multiple,
-                                  kMaxSamplesPerFrame / (chips * coder.baseband_decimation_factor)));
-  coder.upsampling_factor = coder.baseband_decimation_factor * multiple;
   static constexpr int kBits[] = {4, 1, 2, 8};
   coder.bits_per_symbol = kBits[in.Byte() % 4];
+  const int max_frame = std::min(kMaxSamplesPerFrame,
+                                 kMaxTemplateSamples / ((1 << coder.bits_per_symbol) + 1));
+  while (coder.number_of_taps > audio_sorvane::kMinTaps &&
+         (1 << coder.number_of_taps) - 1 > max_frame) {
+    --coder.number_of_taps;
+    coder.code_number = 0;
+  }
+  const int chips = (1 << coder.number_of_taps) - 1;
+  if (chips * coder.baseband_decimation_factor > max_frame) coder.baseband_decimation_factor = 1;
+  multiple = std::max(1, std::min(multiple, max_frame / (chips * coder.baseband_decimation_factor)));
+  coder.upsampling_factor = coder.baseband_decimation_factor * multiple;
   coder.min_cycles_per_frame = in.Pick(0, 16, 4);
   const auto rates = SampleRates();
   coder.sample_rate = rates[in.Byte() % rates.size()];
