@@ -15,11 +15,17 @@ case $name in
   *) max_len=120000 ;;
 esac
 
+# Inputs that once failed are read with the corpus (new units go to the
+# corpus, the first directory).
+regressions=$(dirname "$0")/../fuzz/regressions/$name
+extra=()
+if [ -d "$regressions" ]; then extra=("$regressions"); fi
+
 log=$build/${name}.log
 echo "== ${name}_fuzzer $stop"
 start=$(date +%s)
 "$build/fuzz/${name}_fuzzer" "$stop" -max_len=$max_len -rss_limit_mb=4096 \
-  -print_final_stats=1 "$build/corpus/$name" >"$log" 2>&1
+  -print_final_stats=1 "$build/corpus/$name" "${extra[@]}" >"$log" 2>&1
 rc=$?
 seconds=$(($(date +%s) - start))
 grep -E 'ERROR|SUMMARY|Check failed' "$log" | head -5
