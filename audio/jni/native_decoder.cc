@@ -1,19 +1,17 @@
 // Native side of com.tessal.android.orv.audiomodem.NativeDecoder.
 //
-// A registry of decoders addressed by id: ids 0, 1, 2, ... index a vector
-// that grows on demand and never shrinks; id -1 is a separate default slot.
-// Initialising an id replaces its decoder (the old one is destroyed after
-// the new one is in place). Ids past the end, or negative other than -1,
-// end the process. Nothing here locks: calls for one decoder come from one
-// thread at a time and initialise/release must not overlap other calls.
+// Each function reads its Java arguments and hands them to the decoder
+// registry (decoder_registry.h), which keeps the decoders by id: ids 0, 1,
+// 2, ... and the default slot -1. Ids past the end, or negative other than
+// -1, end the process; operations on an empty slot are logged and do
+// nothing. Nothing here locks: calls for one decoder come from one thread at
+// a time and initialise/release must not overlap other calls.
 #include <jni.h>
 
 #include <cstdint>
-#include <memory>
-#include <utility>
-#include <vector>
 
 #include "audio/audio_modem_decoder.h"
+#include "audio/jni/decoder_registry.h"
 #include "audio/jni/jni_util.h"
 #include "audio/modem_config.h"
 #include "base/logging.h"
@@ -21,32 +19,8 @@
 namespace {
 
 using audio_sorvane::AudioModemDecoder;
+using audio_sorvane::DecoderRegistry;
 using audio_sorvane::ScopedLocalRef;
-
-struct Registry {
-  std::vector<std::unique_ptr<AudioModemDecoder>> decoders;
-  std::unique_ptr<AudioModemDecoder> default_decoder;
-};
-
-Registry& GetRegistry() {
-  static auto* registry = new Registry();
-  return *registry;
-}
-
-std::unique_ptr<AudioModemDecoder>& Slot(int decoder_id) {
-  Registry& registry = GetRegistry();
-  if (decoder_id == -1) return registry.default_decoder;
-  CHECK(decoder_id >= 0 && decoder_id < static_cast<int>(registry.decoders.size()));
-  return registry.decoders[decoder_id];
-}
-
-void Store(int decoder_id, std::unique_ptr<AudioModemDecoder> decoder) {
-  Registry& registry = GetRegistry();
-  if (decoder_id >= static_cast<int>(registry.decoders.size())) {
-    registry.decoders.resize(decoder_id + 1);
-  }
-  std::unique_ptr<AudioModemDecoder> old = std::exchange(Slot(decoder_id), std::move(decoder));
-}
 
 // The 16-bit samples of a direct buffer after the checks, in this order.
 struct PcmBlock {
@@ -95,8 +69,7 @@ Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDsss(
   config.detection_threshold = detection_threshold;
   config.input_sample_rate = input_sample_rate;
   config.buffer_duration_factor = buffer_duration_factor;
-  Store(decoder_id, audio_sorvane::MakeDsssDecoder(config));
-  return JNI_TRUE;
+  return DecoderRegistry::Get().InitializeDsss(decoder_id, config) ? JNI_TRUE : JNI_FALSE;
 }
 
 JNIEXPORT jboolean JNICALL
@@ -122,26 +95,22 @@ Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDtmf(
   config.num_channels = num_channels;
   config.input_sample_rate = input_sample_rate;
   config.buffer_duration_factor = buffer_duration_factor;
-  std::unique_ptr<AudioModemDecoder> decoder = audio_sorvane::MakeDtmfDecoder(config);
-  if (!decoder) return JNI_FALSE;  // refused ADSR window: registry unchanged
-  Store(decoder_id, std::move(decoder));
-  return JNI_TRUE;
+  // A refused ADSR window leaves the registry unchanged.
+  return DecoderRegistry::Get().InitializeDtmf(decoder_id, config) ? JNI_TRUE : JNI_FALSE;
 }
 
 JNIEXPORT void JNICALL
 Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeProcessSamples(
     JNIEnv* env, jclass, jint decoder_id, jobject buffer, jint offset_bytes, jint length_bytes) {
   const PcmBlock block = CheckedBlock(env, buffer, offset_bytes, length_bytes);
-  // The decoders take samples on the 16-bit scale: 1000 stays 1000.0.
-  std::vector<float> samples(block.samples, block.samples + std::max(block.count, 0));
-  Slot(decoder_id)->ProcessSamples(samples);
+  DecoderRegistry::Get().ProcessSamples(decoder_id, block.samples, block.count);
 }
 
 JNIEXPORT void JNICALL
 Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeProcessSamplesWithHotsound(
     JNIEnv* env, jclass, jint decoder_id, jobject buffer, jint offset_bytes, jint length_bytes) {
   const PcmBlock block = CheckedBlock(env, buffer, offset_bytes, length_bytes);
-  Slot(decoder_id)->ProcessSamplesInt16(block.samples, block.count);
+  DecoderRegistry::Get().ProcessSamplesWithHotsound(decoder_id, block.samples, block.count);
 }
 
 JNIEXPORT void JNICALL Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeGetTokens(
@@ -153,7 +122,10 @@ JNIEXPORT void JNICALL Java_com_tessal_android_orv_audiomodem_NativeDecoder_nati
   if (add_token == nullptr) return;
 
   AudioModemDecoder::DecodeResults decoded;
-  if (!Slot(decoder_id)->DecodeTokens(&decoded, num_message_bytes, num_crc_check_bytes)) return;
+  if (!DecoderRegistry::Get().DecodeTokens(decoder_id, &decoded, num_message_bytes,
+                                           num_crc_check_bytes)) {
+    return;
+  }
   for (const AudioModemDecoder::TokenResult& token : decoded.tokens) {
     const jsize size = static_cast<jsize>(token.bytes.size());
     ScopedLocalRef<jbyteArray> array(env, env->NewByteArray(size));
@@ -169,24 +141,24 @@ JNIEXPORT void JNICALL Java_com_tessal_android_orv_audiomodem_NativeDecoder_nati
 JNIEXPORT jboolean JNICALL
 Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeDetectBroadcaster(JNIEnv*, jclass,
                                                                            jint decoder_id) {
-  return Slot(decoder_id)->DetectBroadcaster() ? JNI_TRUE : JNI_FALSE;
+  return DecoderRegistry::Get().DetectBroadcaster(decoder_id) ? JNI_TRUE : JNI_FALSE;
 }
 
 JNIEXPORT void JNICALL
 Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeWipeInternalData(JNIEnv*, jclass,
                                                                           jint decoder_id) {
-  Slot(decoder_id)->WipeInternalData();
+  DecoderRegistry::Get().WipeInternalData(decoder_id);
 }
 
 JNIEXPORT jint JNICALL
 Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeGetMaxSafeInputSize(
     JNIEnv*, jclass, jint decoder_id) {
-  return 2 * Slot(decoder_id)->GetMaxSafeInputSize();
+  return DecoderRegistry::Get().GetMaxSafeInputSize(decoder_id);
 }
 
 JNIEXPORT void JNICALL Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeRelease(
     JNIEnv*, jclass, jint decoder_id) {
-  std::unique_ptr<AudioModemDecoder> old = std::move(Slot(decoder_id));
+  DecoderRegistry::Get().Release(decoder_id);
 }
 
 }  // extern "C"
