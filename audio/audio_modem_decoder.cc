@@ -65,6 +65,11 @@ void AudioModemDecoder::ProcessSamples(std::span<const float> samples) {
   }
 }
 
+void AudioModemDecoder::ProcessPcm16(const int16_t* samples, int count) {
+  float_samples_.assign(samples, samples + std::max(count, 0));
+  ProcessSamples(float_samples_);
+}
+
 void AudioModemDecoder::ProcessSamplesInt16(const int16_t* samples, int count) {
   if (kind_ == kHotsound) hotsound_decoder_->ProcessSamples(samples, count);
 }

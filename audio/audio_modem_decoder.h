@@ -44,6 +44,9 @@ class AudioModemDecoder {
   void Initialize(int num_channels, float input_sample_rate);
   // Samples on the 16-bit scale (not normalised), channels interleaved.
   void ProcessSamples(std::span<const float> samples);
+  // 16-bit samples on their own scale (1000 stays 1000.0), converted into a
+  // buffer the decoder keeps, then as ProcessSamples.
+  void ProcessPcm16(const int16_t* samples, int count);
   // Raw 16-bit samples for the hotsound kind; other kinds ignore them.
   void ProcessSamplesInt16(const int16_t* samples, int count);
   // Tokens of num_message_bytes + num_crc_check_bytes (0 or 2) bytes. With
@@ -67,6 +70,7 @@ class AudioModemDecoder {
   Kind kind_;
   int token_length_bytes_ = 0;
   std::vector<int16_t> int16_samples_;
+  std::vector<float> float_samples_;
   audio_sorvane::DecodeResults raw_;  // the decoder's results, reused per request
   std::vector<TokenResult> spare_tokens_;  // results cut from earlier lists
 };

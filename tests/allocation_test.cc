@@ -6,6 +6,7 @@
 // decoder streams.
 #include <malloc.h>
 
+#include <algorithm>
 #include <atomic>
 #include <cerrno>
 #include <cstddef>
@@ -16,6 +17,7 @@
 #include <span>
 #include <vector>
 
+#include "audio/jni/decoder_registry.h"
 #include "audio/modem_config.h"
 #include "gtest/gtest.h"
 #include "sim/channel_simulator.h"
@@ -162,6 +164,30 @@ TEST(AllocationTest, SteadyStreamingAndRequestsAllocateNothing) {
     EXPECT_EQ(CountAllocations([&] { Stream(*decoder, still, &results); }), 0)
         << "while listening to noise";
   }
+}
+
+// The path the app takes: 16-bit blocks and requests through the registry
+// the NativeDecoder peer drives.
+TEST(AllocationTest, RegistryBlocksAndRequestsAllocateNothing) {
+  if (!SORVEL_COUNT_ALLOCATIONS) GTEST_SKIP() << "malloc belongs to the sanitizer";
+  DecoderRegistry registry;
+  ASSERT_TRUE(registry.InitializeDsss(0, {}));
+  const std::vector<float> audio = Broadcast(false, 16.0, 0.0, 5);
+  std::vector<int16_t> pcm(audio.size());
+  for (size_t i = 0; i < audio.size(); ++i) {
+    pcm[i] = static_cast<int16_t>(std::clamp(audio[i], -32768.0f, 32767.0f));
+  }
+  AudioModemDecoder::DecodeResults results;
+  int found = 0;
+  const auto stream = [&](size_t begin, size_t end) {
+    for (size_t start = begin, n = 0; start + 441 <= end; start += 441, ++n) {
+      registry.ProcessSamples(0, pcm.data() + start, 441);
+      if (n % 25 == 24) found += registry.DecodeTokens(0, &results, 6, 2);
+    }
+  };
+  stream(0, 12 * 44100);
+  ASSERT_GT(found, 0);
+  EXPECT_EQ(CountAllocations([&] { stream(12 * 44100, pcm.size()); }), 0);
 }
 
 }  // namespace

@@ -49,8 +49,7 @@ bool DecoderRegistry::InitializeDtmf(int decoder_id, const DtmfDecoderConfig& co
 void DecoderRegistry::ProcessSamples(int decoder_id, const int16_t* samples, int count) {
   AudioModemDecoder* decoder = Lookup(decoder_id, "ProcessSamples");
   if (decoder == nullptr) return;
-  const std::vector<float> floats(samples, samples + std::max(count, 0));
-  decoder->ProcessSamples(floats);
+  decoder->ProcessPcm16(samples, count);
 }
 
 void DecoderRegistry::ProcessSamplesWithHotsound(int decoder_id, const int16_t* samples,

@@ -121,7 +121,8 @@ JNIEXPORT void JNICALL Java_com_tessal_android_orv_audiomodem_NativeDecoder_nati
   const jmethodID add_token = env->GetMethodID(results_class.get(), "addToken", "([B)V");
   if (add_token == nullptr) return;
 
-  AudioModemDecoder::DecodeResults decoded;
+  // Per thread, so that steady requests reuse the lists' storage.
+  thread_local AudioModemDecoder::DecodeResults decoded;
   if (!DecoderRegistry::Get().DecodeTokens(decoder_id, &decoded, num_message_bytes,
                                            num_crc_check_bytes)) {
     return;
