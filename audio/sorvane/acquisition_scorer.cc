@@ -27,7 +27,8 @@ typedef float Float8 __attribute__((vector_size(32)));
 #define SORVEL_SUM8(v) (((v)[0] + (v)[1]) + ((v)[2] + (v)[3]) + (((v)[4] + (v)[5]) + ((v)[6] + (v)[7])))
 
 #if defined(__x86_64__) && defined(__ELF__)
-#define SORVEL_MULTIVERSION __attribute__((target_clones("avx2", "default")))
+#define SORVEL_MULTIVERSION \
+  __attribute__((target_clones("arch=x86-64-v3", "avx2", "default")))
 #else
 #define SORVEL_MULTIVERSION
 #endif
@@ -109,6 +110,51 @@ SORVEL_MULTIVERSION void FrequencyPowers8(const float* phasors_real,
   }
 }
 
+// The same powers when the frequencies come in pairs +f, -f (a grid
+// symmetric around 0): with phasor = C + jS for +f, the -f phasor is its
+// conjugate, so A = sum_c C_c corr_c and B = sum_c S_c corr_c give both,
+// |A + jB|^2 and |A - jB|^2, for half the multiplications. `cosines` and
+// `sines` hold the phasors of the first num_pairs rows, num_chunks each;
+// row n - 1 - p is the conjugate of row p and the middle row (has_zero) is
+// all ones. out[8 i + j] is frequency i of frame j, as for FrequencyPowers8,
+// with n = 2 num_pairs + has_zero rows.
+SORVEL_MULTIVERSION void PairedFrequencyPowers8(const float* cosines, const float* sines,
+                                                const float* corr_real,
+                                                const float* corr_imaginary, int num_pairs,
+                                                bool has_zero, int num_chunks, float* out) {
+  const int n = 2 * num_pairs + (has_zero ? 1 : 0);
+  for (int p = 0; p < num_pairs; ++p) {
+    const float* cs = cosines + p * num_chunks;
+    const float* sn = sines + p * num_chunks;
+    Float8 ar = {}, ai = {}, br = {}, bi = {};
+    for (int c = 0; c < num_chunks; ++c) {
+      SORVEL_LOAD8(x, corr_real + 8 * c);
+      SORVEL_LOAD8(y, corr_imaginary + 8 * c);
+      ar += cs[c] * x;
+      ai += cs[c] * y;
+      br += sn[c] * x;
+      bi += sn[c] * y;
+    }
+    const Float8 plus_re = ar - bi, plus_im = ai + br;
+    const Float8 minus_re = ar + bi, minus_im = ai - br;
+    const Float8 plus = plus_re * plus_re + plus_im * plus_im;
+    const Float8 minus = minus_re * minus_re + minus_im * minus_im;
+    std::memcpy(out + 8 * p, &plus, sizeof(plus));
+    std::memcpy(out + 8 * (n - 1 - p), &minus, sizeof(minus));
+  }
+  if (has_zero) {
+    Float8 re = {}, im = {};
+    for (int c = 0; c < num_chunks; ++c) {
+      SORVEL_LOAD8(x, corr_real + 8 * c);
+      SORVEL_LOAD8(y, corr_imaginary + 8 * c);
+      re += x;
+      im += y;
+    }
+    const Float8 p = re * re + im * im;
+    std::memcpy(out + 8 * num_pairs, &p, sizeof(p));
+  }
+}
+
 // power[i] = |sum_c phasor[i][c] corr[c]|^2. The phasors are stored by
 // chunk, `padded` frequencies (a multiple of 8) per chunk, so the loop runs
 // across frequencies and needs no horizontal sums.
@@ -169,7 +215,7 @@ void AcquisitionScorer::FrameWindow::Advance() {
 AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
                                      std::span<const float> frequency_offsets,
                                      int num_chunks, int detection_window,
-                                     float smoothing_width)
+                                     float smoothing_width, AcquisitionPath path)
     : frame_size_(static_cast<int>(code_template.size())),
       num_frequencies_(static_cast<int>(frequency_offsets.size())),
       num_chunks_(num_chunks),
@@ -209,6 +255,18 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
     }
   }
   batch_imaginary_.assign(8 * num_chunks_, 0.0f);
+  // The paired form needs rows that are conjugates of their mirror rows
+  // (frequencies symmetric around 0, as the receiver's grids are) and a
+  // middle row of ones.
+  paired_ = path == AcquisitionPath::kFast;
+  for (int i = 0; i < num_frequencies_ && paired_; ++i) {
+    for (int c = 0; c < num_chunks_; ++c) {
+      const std::complex<float> v = phasor_matrix_(i, c);
+      const std::complex<float> mirror = phasor_matrix_(num_frequencies_ - 1 - i, c);
+      paired_ = paired_ && v == std::conj(mirror) &&
+                (2 * i + 1 != num_frequencies_ || v == std::complex<float>(1.0f, 0.0f));
+    }
+  }
   phasors_real_.assign(static_cast<size_t>(num_chunks_) * padded_frequencies_, 0.0f);
   phasors_imaginary_.assign(phasors_real_.size(), 0.0f);
   for (int c = 0; c < num_chunks_; ++c) {
@@ -262,9 +320,16 @@ void AcquisitionScorer::ScoreSamples(std::span<const float> baseband_real_signal
         CorrelateChunks8(code_.data(), real_window_.Frame().data(),
                          imaginary_window_.Frame().data(), num_chunks_, chunk_size_,
                          last_chunk_size_, batch_real_.data(), batch_imaginary_.data());
-        FrequencyPowers8(matrix_real_.data(), matrix_imaginary_.data(), batch_real_.data(),
-                         batch_imaginary_.data(), num_frequencies_, num_chunks_,
-                         batch_powers_.data());
+        if (paired_) {
+          PairedFrequencyPowers8(matrix_real_.data(), matrix_imaginary_.data(),
+                                 batch_real_.data(), batch_imaginary_.data(),
+                                 num_frequencies_ / 2, num_frequencies_ % 2 == 1, num_chunks_,
+                                 batch_powers_.data());
+        } else {
+          FrequencyPowers8(matrix_real_.data(), matrix_imaginary_.data(), batch_real_.data(),
+                           batch_imaginary_.data(), num_frequencies_, num_chunks_,
+                           batch_powers_.data());
+        }
         for (int j = 0; j < 8; ++j) {
           const float score = FinishFrame(batch_powers_.data() + j, 8);
           if (frame_counter_ - first_frame_ > noise_delay_) acquisition_scores->push_back(score);

@@ -25,6 +25,12 @@
 
 namespace audio_sorvane {
 
+// How the frequency powers are computed. kFast combines mirror frequencies
+// (+f, -f) from shared sums, for half the multiplications, when the grid
+// allows it; kReference is the direct complex product per frequency. The
+// two differ by float rounding only: powers agree within a relative 1e-5.
+enum class AcquisitionPath { kFast, kReference };
+
 class AcquisitionScorer {
  public:
   // `code_template`: one baseband frame of the code (F samples);
@@ -32,7 +38,8 @@ class AcquisitionScorer {
   // baseband samples; `smoothing_width` sets the noise smoother's spread.
   AcquisitionScorer(std::span<const float> code_template,
                     std::span<const float> frequency_offsets, int num_chunks,
-                    int detection_window, float smoothing_width);
+                    int detection_window, float smoothing_width,
+                    AcquisitionPath path = AcquisitionPath::kFast);
 
   // Consumes equal-length real and imaginary baseband blocks and replaces
   // `acquisition_scores` with the scores that became available.
@@ -59,6 +66,8 @@ class AcquisitionScorer {
   int64_t frame_counter() const { return frame_counter_; }
   int detection_window_size() const { return detection_window_size_; }
   int history_size() const { return power_history_.size(); }
+  // True when the fast path's paired form is in use.
+  bool paired() const { return paired_; }
 
  private:
   // A sliding window over one baseband stream that holds up to 2F - 1
@@ -107,6 +116,7 @@ class AcquisitionScorer {
   // imaginary parts; the phasors stored by chunk, frequencies padded to a
   // multiple of 8 for the vector loops.
   int padded_frequencies_ = 0;
+  bool paired_ = false;
   std::vector<float> correlations_real_;
   std::vector<float> correlations_imaginary_;
   std::vector<float> phasors_real_;  // num_chunks_ rows of padded_frequencies_

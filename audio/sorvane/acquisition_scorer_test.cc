@@ -76,6 +76,50 @@ TEST_F(AcquisitionScorerTest, ScoresPeaksOnCodePhaseInAnyBlocks) {
   EXPECT_EQ(pieces.DetectionScore(true), 0.0f);
 }
 
+// The fast path pairs mirror frequencies only on a symmetric grid; either
+// way it scores as the direct reference form does, within float rounding,
+// on random baseband fed in random blocks.
+TEST_F(AcquisitionScorerTest, FastPathMatchesReference) {
+  struct Case {
+    std::vector<float> frequencies;
+    bool paired;
+  };
+  const Case cases[] = {
+      {{-0.5f, 0.0f, 0.5f}, true},
+      {{-0.9f, -0.6f, -0.3f, 0.0f, 0.3f, 0.6f, 0.9f}, true},
+      {{-0.45f, -0.15f, 0.15f, 0.45f}, true},  // no zero row
+      {{-0.5f, 0.0f, 0.25f}, false},            // not symmetric: direct form
+  };
+  std::mt19937 rng(4);
+  std::normal_distribution<float> normal(0.0f, 1.0f);
+  std::vector<float> real(5000), imaginary(5000);
+  for (size_t i = 0; i < real.size(); ++i) {
+    real[i] = normal(rng) + (i % 700 < 300 ? code_[i % 62] : 0.0f);
+    imaginary[i] = normal(rng);
+  }
+  for (const Case& c : cases) {
+    AcquisitionScorer fast(code_, c.frequencies, 4, 200, 40.0f, AcquisitionPath::kFast);
+    AcquisitionScorer reference(code_, c.frequencies, 4, 200, 40.0f, AcquisitionPath::kReference);
+    EXPECT_EQ(fast.paired(), c.paired);
+    EXPECT_FALSE(reference.paired());
+    std::vector<float> expected, got, block;
+    reference.ScoreSamples(real, imaginary, &expected);
+    std::uniform_int_distribution<size_t> size(1, 300);
+    for (size_t start = 0, n = 0; start < real.size(); start += n) {
+      n = std::min(size(rng), real.size() - start);
+      fast.ScoreSamples(std::span(real).subspan(start, n), std::span(imaginary).subspan(start, n),
+                        &block);
+      got.insert(got.end(), block.begin(), block.end());
+    }
+    ASSERT_EQ(got.size(), expected.size());
+    for (size_t i = 0; i < got.size(); ++i) {
+      ASSERT_NEAR(got[i], expected[i], 1e-4f * std::max(expected[i], 1.0f)) << i;
+    }
+    EXPECT_NEAR(fast.DetectionScore(true), reference.DetectionScore(true),
+                1e-4f * reference.DetectionScore(true));
+  }
+}
+
 #if GTEST_HAS_DEATH_TEST
 using AcquisitionScorerDeathTest = AcquisitionScorerTest;
 
