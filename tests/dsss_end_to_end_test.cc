@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "audio/modem_config.h"
+#include "audio/sorvane/crc16_coder.h"
 #include "audio/sorvane/sorvane_decoder.h"
 #include "gtest/gtest.h"
 #include "sim/channel_simulator.h"
@@ -158,6 +159,22 @@ TEST(DsssEndToEndTest, OverlongInputAndBoundedBuffers) {
   }
   EXPECT_LE(largest, max_baseband);
   EXPECT_GT(largest, 14700 * 2);
+}
+
+// A receiver that listened to noise first may have tracked a noise peak;
+// a broadcast whose frames happen to fall on that track's grid must still
+// get a Doppler search of its own. These leads put the broadcast on the
+// grid of such a track.
+TEST(DsssEndToEndTest, BroadcastAfterNoiseIsNotScoredOnANoiseTrack) {
+  Link link;
+  link.token = {0xfe, 0x07, 0x92, 0x61, 0xc0, 0x45, 0x00, 0x00};
+  std::vector<uint8_t> message(link.token.begin(), link.token.begin() + 6);
+  Crc16Coder({.num_message_bytes = 6}).Encode(&message);
+  link.token = message;
+  for (double lead : {5.04, 5.08}) {
+    SCOPED_TRACE(lead);
+    EXPECT_EQ(DecodeLink(link, 4.0, {.leading_silence = lead, .snr_db = 20.0}), link.token);
+  }
 }
 
 // Days of listening move every stream position past 2^31 and 2^32 baseband

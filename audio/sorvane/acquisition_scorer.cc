@@ -1,6 +1,7 @@
 #include "audio/sorvane/acquisition_scorer.h"
 
 #include <algorithm>
+#include <bit>
 #include <cmath>
 #include <cstring>
 #include <numbers>
@@ -186,12 +187,6 @@ void DesignNoiseSmoother(double width, int* delay, float* alpha) {
   *alpha = static_cast<float>(1.0 - a);
 }
 
-int SmootherDelay(float width) {
-  int delay;
-  float alpha;
-  DesignNoiseSmoother(width, &delay, &alpha);
-  return delay;
-}
 
 }  // namespace
 
@@ -223,15 +218,19 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
       detection_num_frames_((detection_window_size_ + 1 - frame_size_) / frame_size_),
       detection_num_shifts_(detection_window_size_ + 1 - detection_num_frames_ * frame_size_),
       chunk_size_(0),
-      last_chunk_size_(0),
-      power_history_(std::max({SmootherDelay(smoothing_width) + 1,
-                               detection_window_size_,
-                               std::max(SmootherDelay(smoothing_width), 10)})) {
+      last_chunk_size_(0) {
   CHECK(num_chunks_ > 0);
   CHECK(detection_num_frames_ >= 1);
   CHECK(detection_num_shifts_ >= frame_size_);
   DesignNoiseSmoother(smoothing_width, &noise_delay_, &noise_alpha_);
   warmup_frames_ = std::max(noise_delay_, 10);
+  // The history holds the frames read back: the delayed frame (N + 1), the
+  // warm-up, and the detection window's oldest frame, W + 1 - F back. One
+  // flat ring of power-of-two rows, addressed by the frame counter.
+  const int rows = std::max({noise_delay_ + 1, warmup_frames_,
+                             detection_window_size_ + 1 - frame_size_});
+  history_rows_ = static_cast<int>(std::bit_ceil(static_cast<unsigned>(rows)));
+  history_.assign(static_cast<size_t>(history_rows_) * num_frequencies_, 0.0f);
 
   chunk_size_ = static_cast<int>(
       std::ceil(static_cast<float>(frame_size_) / static_cast<float>(num_chunks_)));
@@ -286,13 +285,13 @@ void AcquisitionScorer::Reset(int64_t first_frame) {
   frame_counter_ = first_frame_ = first_frame;
   real_window_.Clear();
   imaginary_window_.Clear();
-  power_history_.Fill(FloatVector::Zero(num_frequencies_));
+  std::fill(history_.begin(), history_.end(), 0.0f);
 }
 
 void AcquisitionScorer::ZeroHistory() {
   std::fill(real_window_.samples.begin(), real_window_.samples.end(), 0.0f);
   std::fill(imaginary_window_.samples.begin(), imaginary_window_.samples.end(), 0.0f);
-  power_history_.Fill(FloatVector::Zero(num_frequencies_));
+  std::fill(history_.begin(), history_.end(), 0.0f);
 }
 
 void AcquisitionScorer::ScoreSamples(std::span<const float> baseband_real_signal,
@@ -362,7 +361,7 @@ float AcquisitionScorer::ScoreFrame(std::span<const float> baseband_frame_real,
 float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
   const int64_t n = frame_counter_;
   const int64_t age = n - first_frame_;
-  float* power = power_history_[n].data();
+  float* power = HistoryRow(n);
   float power_sum = 0.0f;
   for (int i = 0; i < num_frequencies_; ++i) {
     power[i] = powers[i * stride];
@@ -372,7 +371,9 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
   float score = 0.0f;
   if (age == warmup_frames_ - 1) {
     float sum = 0.0f;
-    for (int k = 0; k < warmup_frames_; ++k) sum += power_history_[first_frame_ + k].sum();
+    for (int k = 0; k < warmup_frames_; ++k) {
+      sum += Eigen::Map<const FloatVector>(HistoryRow(first_frame_ + k), num_frequencies_).sum();
+    }
     noise_level_1_ = noise_level_2_ =
         sum / static_cast<float>(num_frequencies_ * warmup_frames_);
   } else if (age > warmup_frames_ - 1) {
@@ -381,7 +382,7 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
     noise_level_2_ += noise_alpha_ * (noise_level_1_ - noise_level_2_);
   }
   if (age >= warmup_frames_ - 1) {
-    const float* delayed = power_history_[n - noise_delay_].data();
+    const float* delayed = HistoryRow(n - noise_delay_);
     const float peak = *std::max_element(delayed, delayed + num_frequencies_);
     score = peak / (noise_level_2_ + 1e-12f);
   }
@@ -397,7 +398,8 @@ float AcquisitionScorer::DetectionScore(bool normalize) const {
   for (int s = 0; s < detection_num_shifts_; ++s) {
     accumulated.setZero();
     for (int m = 0; m < detection_num_frames_; ++m) {
-      accumulated += power_history_[frame_counter_ - 1 - s - m * frame_size_];
+      accumulated += Eigen::Map<const FloatVector>(
+          HistoryRow(frame_counter_ - 1 - s - m * frame_size_), num_frequencies_);
     }
     peak = std::max(peak, accumulated.maxCoeff());
     total += accumulated.sum();

@@ -21,7 +21,6 @@
 #include <vector>
 
 #include "audio/dsp/eigen_types.h"
-#include "audio/sorvane/circular_array.h"
 
 namespace audio_sorvane {
 
@@ -65,7 +64,7 @@ class AcquisitionScorer {
   // The number of the next frame: frames scored since Reset plus its first_frame.
   int64_t frame_counter() const { return frame_counter_; }
   int detection_window_size() const { return detection_window_size_; }
-  int history_size() const { return power_history_.size(); }
+  int history_size() const { return history_rows_; }
   // True when the fast path's paired form is in use.
   bool paired() const { return paired_; }
 
@@ -133,7 +132,15 @@ class AcquisitionScorer {
   float noise_level_1_ = 0.0f;
   float noise_level_2_ = 0.0f;
   int warmup_frames_;
-  CircularArray<audio_dsp::FloatVector> power_history_;
+  // Frequency powers of the recent frames: row (frame & (rows - 1)).
+  int history_rows_ = 0;
+  std::vector<float> history_;
+  float* HistoryRow(int64_t frame) {
+    return history_.data() + (frame & (history_rows_ - 1)) * num_frequencies_;
+  }
+  const float* HistoryRow(int64_t frame) const {
+    return history_.data() + (frame & (history_rows_ - 1)) * num_frequencies_;
+  }
 };
 
 }  // namespace audio_sorvane

@@ -376,16 +376,21 @@ void SorvaneDecoder::ScoreGroupOverMultipath(const DecodingGroup& group,
     if (reference == nullptr || frame.score > reference->score) reference = &frame;
   }
   if (reference == nullptr) return;
-  // The group continues the current track when its strongest frame lies on
-  // the track's grid; otherwise it starts a new one with its own Doppler
-  // search.
+  // The group continues the current track when it continues the
+  // transmission the track was found on (it begins within max_gap of where
+  // that one was last seen) and its strongest frame lies on the track's
+  // grid; otherwise it starts a new track with its own Doppler search. A
+  // track found on a noise peak must not lend its Doppler to a broadcast
+  // that happens to fall on its grid.
   const int64_t tolerance = std::lround(params_.max_phase_error * frame_size_);
-  if (!multipath_->has_track() ||
+  const int64_t first = discarded + times.front();
+  if (!multipath_->has_track() || first > track_last_seen_ + params_.max_gap ||
       std::abs(reference->start -
                multipath_->FrameStart(multipath_->NearestFrame(reference->start))) > tolerance) {
     multipath_->StartTrack(reference->start,
                            multipath_->SearchDoppler(view, reference->start));
   }
+  track_last_seen_ = discarded + times.back();
   for (const SlotFrame& frame : frames) {
     if (multipath_->Score(view, multipath_->NearestFrame(frame.start), &scores_)) {
       symbol_scores->try_emplace(frame.slot, scores_);

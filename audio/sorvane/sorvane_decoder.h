@@ -181,6 +181,7 @@ class SorvaneDecoder {
   int64_t samples_processed_ = 0;
   std::map<int64_t, audio_dsp::FloatVector> symbol_score_cache_;
   std::unique_ptr<MultipathScorer> multipath_;
+  int64_t track_last_seen_ = 0;  // the last detection of the track's transmission
 
   // Scratch, kept to avoid allocation per block.
   std::vector<float> mono_;
