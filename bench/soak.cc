@@ -168,11 +168,19 @@ Result Soak(const char* name, bool dtmf, const Options& o, Feed feed, Decode dec
   Result result;
   bool begins = false, heard = false;
   long baseline = -1, largest_growth = 0;
-  int64_t next_sample = interval;
+  int64_t next_sample = interval, broadcast_start = 0;
+  const auto tally = [&] {
+    result.decoded += heard;
+    if (!heard) {
+      std::printf("%s: MISSED the broadcast at %.2f %ss\n", name,
+                  broadcast_start / unit_samples, unit);
+    }
+  };
   for (int64_t n = 0; audio.Next(&block, &begins); ++n) {
     if (begins) {
-      if (audio.broadcasts() > 1) result.decoded += heard;
+      if (audio.broadcasts() > 1) tally();
       heard = false;
+      broadcast_start = audio.position() - static_cast<int64_t>(kBlock);
     }
     feed(block);
     if (n % 25 == 24) {
@@ -187,7 +195,7 @@ Result Soak(const char* name, bool dtmf, const Options& o, Feed feed, Decode dec
       next_sample += interval;
     }
   }
-  if (audio.broadcasts() > 0) result.decoded += heard;
+  if (audio.broadcasts() > 0) tally();
   result.broadcasts = audio.broadcasts();
   result.heap_flat = largest_growth <= kHeapMarginBytes;
   std::printf("%s: heap at the first %s %ld bytes, largest growth after it %ld bytes "
@@ -303,6 +311,7 @@ std::string ParseOptions(int argc, char** argv, Options* o) {
   // a few seconds more to report it before the next one.
   if (o->every < 10) return "--every must be at least 10 seconds";
   if (o->seconds < 10) return "the soak must last at least 10 seconds";
+  if (o->seconds > 10000 * 3600.0) return "the soak must last at most 10000 hours";
   if (!o->pcm.empty() && o->sent.empty()) return "--pcm needs --sent FILE";
   if (o->pcm.empty() && !o->sent.empty()) return "--sent goes with --pcm";
   return "";

@@ -37,6 +37,7 @@ positive='^([0-9]+\.?[0-9]*|\.[0-9]+)$'
 [[ $hours =~ $positive ]] && awk "BEGIN { exit !($hours > 0) }" ||
   refuse "--hours must be a positive number, got '$hours'"
 [[ $every =~ $positive ]] || refuse "--every must be a positive number, got '$every'"
+awk "BEGIN { exit !($every >= 10) }" || refuse "--every must be at least 10 seconds"
 case $scheme in
   dsss) pcm=dsss flags=() ;;
   hotsound) pcm=dsss flags=(--hotsound) ;;
