@@ -5,7 +5,7 @@ MAKEFLAGS += --no-print-directory
 SHELL := /bin/bash
 CMAKE_FLAGS ?= -DCMAKE_BUILD_TYPE=RelWithDebInfo -DSORVEL_WERROR=ON
 
-.PHONY: all deps configure build test demo bench soak sanitize arm64 fuzz fuzz-build fuzz-long clean
+.PHONY: all deps configure build test demo bench soak soak-long soak-stream sanitize arm64 fuzz fuzz-build fuzz-long clean
 
 all: build
 
@@ -35,6 +35,21 @@ bench: build
 # Two hours through every decoder kind; prints the figures.
 soak: build
 	@$(BUILD_DIR)/bench/sorvel_soak --minutes 120 --every 180
+
+# SOAK_HOURS through every decoder kind (or SOAK_KINDS), a broadcast every
+# ten minutes; prints the heap and RSS every hour.
+SOAK_HOURS ?= 100
+SOAK_KINDS ?= dsss,hotsound,dtmf
+soak-long: build
+	@$(BUILD_DIR)/bench/sorvel_soak --hours $(SOAK_HOURS) --every 600 --kinds $(SOAK_KINDS)
+
+# HOURS of raw PCM through `sorvel decode -` (SCHEME dsss, hotsound or
+# dtmf), a broadcast every ten minutes; counts them and reports the peak RSS.
+HOURS ?= 42
+SCHEME ?= dsss
+soak-stream: build
+	@bash tools/stream_soak.sh --hours $(HOURS) --every 600 --scheme $(SCHEME) \
+	  --build $(BUILD_DIR) --out out/stream-soak-$(SCHEME)
 
 # The test suite under AddressSanitizer + UBSan. The JVM tests are left out:
 # the JVM does not start with the ASan runtime preloaded into its process.
