@@ -183,7 +183,8 @@ void MultipathScorer::ReserveFrames(int count) {
     one[0].scores.setZero(tones_.rows());
     spare_frames_.push_back(one.extract(one.begin()));
   }
-  while (static_cast<int>(profile_pool_.size()) < count) {
+  // Profiles only for sounded frames.
+  while (static_cast<int>(profile_pool_.size()) < count / kSoundingInterval + 1) {
     profile_pool_.emplace_back().reserve(lags_);
   }
 }

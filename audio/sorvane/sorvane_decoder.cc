@@ -129,6 +129,13 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
         std::ceil(max_buffer_size_ / input_per_baseband_ / frame_size_));
     multipath_->ReserveFrames(baseband_frames + 2 * params_.channel_frames + 4);
   }
+  // The most a full buffer holds (one frame of rounding either side), so
+  // that streaming never grows the buffers.
+  const int max_baseband =
+      static_cast<int>(std::ceil(max_buffer_size_ / input_per_baseband_)) + 2 * frame_size_;
+  for (StreamBuffer* buffer : {&baseband_real_, &baseband_imaginary_, &acquisition_scores_}) {
+    buffer->Reserve(max_baseband);
+  }
   initialized_ = true;
 }
 

@@ -5,7 +5,7 @@
 // stays exact for millennia of listening, where 32 bits wrap within days.
 //
 // Discard moves the start of the held samples forward and compacts the
-// storage (elements move down) once the dead prefix exceeds a quarter of the
+// storage (elements move down) once the dead prefix exceeds an eighth of the
 // held samples, so a receiver that discards a little per block moves each
 // sample a few times, not once per discard. Not thread safe. Out-of-range
 // discards and negative offsets end the process through CHECK.
@@ -36,7 +36,7 @@ class StreamBuffer {
     CHECK(num_samples <= static_cast<int>(buffer_.size()));
     buffer_.start += num_samples;
     num_discarded_samples_ += num_samples;
-    if (buffer_.start > buffer_.size() / 4) {
+    if (buffer_.start > buffer_.size() / 8) {
       buffer_.storage.erase(buffer_.storage.begin(),
                             buffer_.storage.begin() + static_cast<ptrdiff_t>(buffer_.start));
       buffer_.start = 0;
@@ -49,6 +49,12 @@ class StreamBuffer {
     CHECK(offset >= 0);
     if (offset >= size()) return {};
     return {buffer_.data() + offset, buffer_.size() - offset};
+  }
+
+  // Makes room for `num_samples` held samples (and the dead prefix they
+  // may trail), so that appending up to that many never reallocates.
+  void Reserve(int num_samples) {
+    buffer_.storage.reserve(static_cast<size_t>(num_samples) + num_samples / 8 + 1);
   }
 
   // Drops every sample and numbers the next appended sample `origin` (0
@@ -72,7 +78,7 @@ class StreamBuffer {
 
  private:
   // The held samples are storage[start ...]; the dead prefix before start is
-  // dropped once it outgrows a quarter of them.
+  // dropped once it outgrows an eighth of them.
   struct Samples {
     std::vector<float> storage;
     size_t start = 0;
