@@ -22,19 +22,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const audio_sorvane::DsssDecoderConfig config = sorvel_fuzz::ReadDsssSettings(in, false);
   if (!audio_sorvane::ValidateDsssCoderConfig(config.coder).empty()) __builtin_trap();
   const auto decoder = audio_sorvane::MakeDsssDecoder(config);
-  std::vector<float> floats;
-  int requests = 0;
   // 16384 frames (0.37 s at 44.1 kHz) at most: enough for a few short-frame
   // tokens, and each run stays a few milliseconds.
-  sorvel_fuzz::RunAudioScript(
-      in, config.num_channels, 16384,
-      [&](std::span<const int16_t> block) {
-        floats.assign(block.begin(), block.end());
-        decoder->ProcessSamples(floats);
-      },
-      [&](uint8_t a) {
-        if (++requests <= sorvel_fuzz::kMaxRequests) sorvel_fuzz::Act(*decoder, a);
-      });
-  if (requests == 0) sorvel_fuzz::Act(*decoder, 0);
+  sorvel_fuzz::RunDecoderScript(in, *decoder, config.num_channels, 16384);
   return 0;
 }

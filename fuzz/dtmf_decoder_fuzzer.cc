@@ -24,19 +24,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (!audio_sorvane::ValidateDtmfConfig(config.tones).empty()) return 0;
   const auto decoder = audio_sorvane::MakeDtmfDecoder(config);
   if (!decoder) return 0;  // refused ADSR window
-  std::vector<float> floats;
-  int requests = 0;
   // 16384 frames (0.37 s at 44.1 kHz) at most: enough for a few short-frame
   // tokens, and each run stays a few milliseconds.
-  sorvel_fuzz::RunAudioScript(
-      in, config.num_channels, 16384,
-      [&](std::span<const int16_t> block) {
-        floats.assign(block.begin(), block.end());
-        decoder->ProcessSamples(floats);
-      },
-      [&](uint8_t a) {
-        if (++requests <= sorvel_fuzz::kMaxRequests) sorvel_fuzz::Act(*decoder, a);
-      });
-  if (requests == 0) sorvel_fuzz::Act(*decoder, 0);
+  sorvel_fuzz::RunDecoderScript(in, *decoder, config.num_channels, 16384);
   return 0;
 }

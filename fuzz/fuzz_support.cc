@@ -249,4 +249,23 @@ void QuietLogs() {
   sorvel_base::SetLogSink(&sink);
 }
 
+void RunDecoderScript(FuzzInput& in, audio_sorvane::AudioModemDecoder& decoder, int channels,
+                      int max_frames,
+                      const std::function<void(std::span<const int16_t>)>& feed) {
+  int requests = 0;
+  RunAudioScript(
+      in, channels, max_frames,
+      [&](std::span<const int16_t> block) {
+        if (feed) {
+          feed(block);
+        } else {
+          decoder.ProcessPcm16(block.data(), static_cast<int>(block.size()));
+        }
+      },
+      [&](uint8_t a) {
+        if (++requests <= kMaxRequests) Act(decoder, a);
+      });
+  if (requests == 0) Act(decoder, 0);
+}
+
 }  // namespace sorvel_fuzz

@@ -80,6 +80,13 @@ void Act(audio_sorvane::AudioModemDecoder& decoder, uint8_t a);
 // over the multipath search and costs more than the audio it looks at.
 inline constexpr int kMaxRequests = 4;
 
+// Runs the audio script on `decoder`: blocks go to `feed` (by default the
+// decoder's 16-bit path), requests to Act up to kMaxRequests, and one
+// request at the end if the script made none.
+void RunDecoderScript(FuzzInput& in, audio_sorvane::AudioModemDecoder& decoder, int channels,
+                      int max_frames,
+                      const std::function<void(std::span<const int16_t>)>& feed = nullptr);
+
 // Drops log lines below FATAL: misuse that the fuzzers make on purpose logs
 // on every run and would slow them down. Fatal checks still print.
 void QuietLogs();

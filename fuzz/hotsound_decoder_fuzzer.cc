@@ -31,23 +31,16 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   };
   const auto decoder = audio_sorvane::MakeDsssDecoder(config);
   const bool int16_path = in.Byte() & 1;
-  std::vector<float> floats;
-  int requests = 0;
   // Two seconds of audio at most: enough to wake, decode and time out.
-  sorvel_fuzz::RunAudioScript(
-      in, config.num_channels, static_cast<int>(2 * config.input_sample_rate),
+  sorvel_fuzz::RunDecoderScript(
+      in, *decoder, config.num_channels, static_cast<int>(2 * config.input_sample_rate),
       [&](std::span<const int16_t> block) {
         frames += static_cast<int64_t>(block.size()) / config.num_channels;
         if (int16_path) {
           decoder->ProcessSamplesInt16(block.data(), static_cast<int>(block.size()));
         } else {
-          floats.assign(block.begin(), block.end());
-          decoder->ProcessSamples(floats);
+          decoder->ProcessPcm16(block.data(), static_cast<int>(block.size()));
         }
-      },
-      [&](uint8_t a) {
-        if (++requests <= sorvel_fuzz::kMaxRequests) sorvel_fuzz::Act(*decoder, a);
       });
-  if (requests == 0) sorvel_fuzz::Act(*decoder, 0);
   return 0;
 }
