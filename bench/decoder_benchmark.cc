@@ -12,6 +12,8 @@
 #include "audio/hotsound_detector.h"
 #include "audio/modem_config.h"
 #include "audio/sorvane/sorvane_decoder.h"
+#include "audio/sorvane/acquisition_scorer.h"
+#include "audio/sorvane/sorvane_util.h"
 #include "benchmark/benchmark.h"
 #include "sim/channel_simulator.h"
 
@@ -56,6 +58,34 @@ void BM_DsssDecoderRealTime(benchmark::State& state) {
       static_cast<double>(signal.size()) / 44100.0, benchmark::Counter::kIsIterationInvariantRate);
 }
 BENCHMARK(BM_DsssDecoderRealTime)->Unit(benchmark::kMillisecond);
+
+// The acquisition scorer alone at the default geometry, on 10 s of random
+// baseband in 147-sample blocks (10 ms); arg 1 forces the reference path.
+void BM_AcquisitionScorer(benchmark::State& state) {
+  const audio_sorvane::SymbolWaveCoder coder(audio_sorvane::MakeSymbolWaveCoderParams({}));
+  const audio_sorvane::SorvaneDecoderParams params;
+  std::vector<float> grid;
+  audio_sorvane::FrequencyGrid(
+      params.acquisition_frequency_step,
+      static_cast<float>(params.max_speed * coder.carrier_cycles_per_frame() / 343.0), &grid);
+  audio_sorvane::AcquisitionScorer scorer(
+      coder.baseband_code(), grid, params.num_chunks, 2573,
+      static_cast<float>(params.noise_smoothing_width),
+      state.range(0) ? audio_sorvane::AcquisitionPath::kReference
+                     : audio_sorvane::AcquisitionPath::kFast);
+  const std::vector<float> real = sorvel_sim::MakeNoise(sorvel_sim::NoiseKind::kWhite, 147000, 1.0, 1);
+  const std::vector<float> imaginary = sorvel_sim::MakeNoise(sorvel_sim::NoiseKind::kWhite, 147000, 1.0, 2);
+  std::vector<float> scores;
+  for (auto _ : state) {
+    for (size_t start = 0; start + 147 <= real.size(); start += 147) {
+      scorer.ScoreSamples(std::span(real).subspan(start, 147),
+                          std::span(imaginary).subspan(start, 147), &scores);
+    }
+    benchmark::DoNotOptimize(scores.data());
+  }
+  state.counters["x_real_time"] = benchmark::Counter(10.0, benchmark::Counter::kIsIterationInvariantRate);
+}
+BENCHMARK(BM_AcquisitionScorer)->Arg(0)->Arg(1)->Unit(benchmark::kMillisecond);
 
 // The hotsound wake-up detector alone on the same audio and blocks (items:
 // input samples). Its budget is 3 % of BM_DsssDecoderRealTime's time per
