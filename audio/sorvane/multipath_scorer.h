@@ -55,6 +55,7 @@ struct BasebandView {
 
 class MultipathScorer {
  public:
+  // `coder` must outlive the scorer (its tone matrix is read, not copied).
   MultipathScorer(const SymbolWaveCoder& coder, const MultipathScorerParams& params);
 
   // True when the lag window of a frame starting at absolute index `start`
@@ -134,7 +135,7 @@ class MultipathScorer {
   float carrier_cycles_per_frame_;
   bool use_quadrature_;
   std::vector<float> code_;
-  audio_dsp::FloatMatrix tones_;
+  const audio_dsp::FloatMatrix& tones_;  // the coder's, which outlives the scorer
   audio_dsp::ComplexFFTTransformer fft_;
   std::vector<std::complex<float>> code_spectrum_;  // conjugated
 

@@ -68,48 +68,56 @@ SymbolWaveCoder::SymbolWaveCoder(const SymbolWaveCoderParams& params)
   InterpolateCode(params_.code, baseband_size, &baseband_code_);
   baseband_tones_ =
       ToneMatrix(alphabet_size_, baseband_size, params_.min_cycles_per_frame);
+}
 
-  std::vector<float> code;
-  InterpolateCode(params_.code, n, &code);
-  const audio_dsp::FloatMatrix tones =
-      ToneMatrix(alphabet_size_, n, params_.min_cycles_per_frame);
-  const double omega = carrier_cycles_per_frame_ * 2.0 * std::numbers::pi / n;
-  std::vector<float> sine(n), quadrature(n);
-  for (int i = 0; i < n; ++i) {
-    sine[i] = static_cast<float>(std::sin(omega * i));
-    quadrature[i] = params_.use_quadrature
-                        ? static_cast<float>(std::cos(omega * i))
-                        : sine[i];
-  }
-
-  templates_.assign(alphabet_size_, std::vector<float>(n));
-  float peak = 0.0f;
-  for (int k = 0; k < alphabet_size_; ++k) {
-    std::vector<float>& frame = templates_[k];
+// The full-rate templates only a transmitter reads: built on first use, so
+// a receiver never holds them (about 130 kB at the defaults).
+const std::vector<std::vector<float>>& SymbolWaveCoder::Templates() const {
+  std::call_once(templates_once_, [this] {
+    const int n = samples_per_frame_;
+    std::vector<float> code;
+    InterpolateCode(params_.code, n, &code);
+    const audio_dsp::FloatMatrix tones =
+        ToneMatrix(alphabet_size_, n, params_.min_cycles_per_frame);
+    const double omega = carrier_cycles_per_frame_ * 2.0 * std::numbers::pi / n;
+    std::vector<float> sine(n), quadrature(n);
     for (int i = 0; i < n; ++i) {
-      frame[i] = code[i] * (quadrature[i] * tones(k, i) +
-                            params_.pedestal_amplitude * sine[i]);
-      peak = std::max(peak, std::fabs(frame[i]));
+      sine[i] = static_cast<float>(std::sin(omega * i));
+      quadrature[i] = params_.use_quadrature
+                          ? static_cast<float>(std::cos(omega * i))
+                          : sine[i];
     }
-  }
-  // A zero carrier (desired frequency 0, no quadrature) leaves every
-  // template silent; there is nothing to scale then.
-  if (peak > 0.0f) {
-    const float scale = 1.0f / peak;
-    for (std::vector<float>& frame : templates_) {
-      for (float& v : frame) v *= scale;
+
+    templates_.assign(alphabet_size_, std::vector<float>(n));
+    float peak = 0.0f;
+    for (int k = 0; k < alphabet_size_; ++k) {
+      std::vector<float>& frame = templates_[k];
+      for (int i = 0; i < n; ++i) {
+        frame[i] = code[i] * (quadrature[i] * tones(k, i) +
+                              params_.pedestal_amplitude * sine[i]);
+        peak = std::max(peak, std::fabs(frame[i]));
+      }
     }
-  }
+    // A zero carrier (desired frequency 0, no quadrature) leaves every
+    // template silent; there is nothing to scale then.
+    if (peak > 0.0f) {
+      const float scale = 1.0f / peak;
+      for (std::vector<float>& frame : templates_) {
+        for (float& v : frame) v *= scale;
+      }
+    }
+  });
+  return templates_;
 }
 
 std::span<const float> SymbolWaveCoder::SymbolWaveform(int symbol) const {
   CHECK(symbol >= 0);
   CHECK(symbol < alphabet_size_);
-  return templates_[symbol];
+  return Templates()[symbol];
 }
 
 std::span<const float> SymbolWaveCoder::StartWaveform() const {
-  return templates_.back();
+  return Templates().back();
 }
 
 float SymbolWaveCoder::CarrierFrequency() const {

@@ -14,10 +14,11 @@
 // and tones at N / baseband_decimation_factor samples per frame.
 //
 // Built once per encoder or decoder; immutable afterwards and safe to share
-// between threads. Invalid parameters end the process through CHECK.
+// between threads (the full-rate templates are built on first use). Invalid parameters end the process through CHECK.
 #ifndef AUDIO_SORVANE_SYMBOL_WAVE_CODER_H_
 #define AUDIO_SORVANE_SYMBOL_WAVE_CODER_H_
 
+#include <mutex>
 #include <span>
 #include <vector>
 
@@ -68,7 +69,9 @@ class SymbolWaveCoder {
   int alphabet_size_;
   std::vector<float> baseband_code_;
   audio_dsp::FloatMatrix baseband_tones_;
-  std::vector<std::vector<float>> templates_;
+  const std::vector<std::vector<float>>& Templates() const;
+  mutable std::once_flag templates_once_;
+  mutable std::vector<std::vector<float>> templates_;
 };
 
 // Band-limited periodic interpolation of `code` (length L) to `length`
