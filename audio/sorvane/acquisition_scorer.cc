@@ -362,11 +362,25 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
   const int64_t n = frame_counter_;
   const int64_t age = n - first_frame_;
   float* power = HistoryRow(n);
-  float power_sum = 0.0f;
-  for (int i = 0; i < num_frequencies_; ++i) {
+  // Sums and maxima in four interleaved parts: one running value would make
+  // every step wait on the previous one.
+  float s0 = 0.0f, s1 = 0.0f, s2 = 0.0f, s3 = 0.0f;
+  int i = 0;
+  for (; i + 4 <= num_frequencies_; i += 4) {
     power[i] = powers[i * stride];
-    power_sum += power[i];
+    power[i + 1] = powers[(i + 1) * stride];
+    power[i + 2] = powers[(i + 2) * stride];
+    power[i + 3] = powers[(i + 3) * stride];
+    s0 += power[i];
+    s1 += power[i + 1];
+    s2 += power[i + 2];
+    s3 += power[i + 3];
   }
+  for (; i < num_frequencies_; ++i) {
+    power[i] = powers[i * stride];
+    s0 += power[i];
+  }
+  const float power_sum = (s0 + s1) + (s2 + s3);
 
   float score = 0.0f;
   if (age == warmup_frames_ - 1) {
@@ -383,7 +397,16 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
   }
   if (age >= warmup_frames_ - 1) {
     const float* delayed = HistoryRow(n - noise_delay_);
-    const float peak = *std::max_element(delayed, delayed + num_frequencies_);
+    float m0 = delayed[0], m1 = delayed[0], m2 = delayed[0], m3 = delayed[0];
+    int k = 1;
+    for (; k + 4 <= num_frequencies_; k += 4) {
+      m0 = std::max(m0, delayed[k]);
+      m1 = std::max(m1, delayed[k + 1]);
+      m2 = std::max(m2, delayed[k + 2]);
+      m3 = std::max(m3, delayed[k + 3]);
+    }
+    for (; k < num_frequencies_; ++k) m0 = std::max(m0, delayed[k]);
+    const float peak = std::max(std::max(m0, m1), std::max(m2, m3));
     score = peak / (noise_level_2_ + 1e-12f);
   }
   ++frame_counter_;

@@ -108,6 +108,10 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
                          coder_->samples_per_frame();
   const double omega = -2.0 * std::numbers::pi * carrier / sample_rate;
   rotation_ = {std::cos(omega), std::sin(omega)};
+  for (int k = 0; k < kMixLanes; ++k) {
+    mix_rotations_[k] = {std::cos(omega * k), std::sin(omega * k)};
+  }
+  mix_step_ = {std::cos(omega * kMixLanes), std::sin(omega * kMixLanes)};
   oscillator_ = {1.0, 0.0};
   baseband_resampler_ = std::make_unique<audio_dsp::RationalFactorResampler<std::complex<float>>>(
       audio_dsp::DefaultResamplingKernel(sample_rate, baseband_rate_), 2000);
@@ -224,10 +228,28 @@ void SorvaneDecoder::ProcessMono(std::span<const float> samples) {
     received_samples_.Append(samples);
   }
   mixed_.resize(samples.size());
+  // Eight phasors per step from one oscillator value, so that the products
+  // do not wait on each other as a running oscillator would.
+  const auto multiply = [](std::complex<double> a, std::complex<double> b) {
+    return std::complex<double>(a.real() * b.real() - a.imag() * b.imag(),
+                                a.real() * b.imag() + a.imag() * b.real());
+  };
   std::complex<double> oscillator = oscillator_;
-  for (size_t i = 0; i < samples.size(); ++i) {
-    mixed_[i] = std::complex<float>(static_cast<double>(samples[i]) * oscillator);
-    oscillator *= rotation_;
+  size_t i = 0;
+  for (; i + kMixLanes <= samples.size(); i += kMixLanes) {
+    for (int k = 0; k < kMixLanes; ++k) {
+      const std::complex<double> phasor = multiply(oscillator, mix_rotations_[k]);
+      const double x = samples[i + k];
+      mixed_[i + k] = {static_cast<float>(x * phasor.real()),
+                       static_cast<float>(x * phasor.imag())};
+    }
+    oscillator = multiply(oscillator, mix_step_);
+  }
+  for (; i < samples.size(); ++i) {
+    const double x = samples[i];
+    mixed_[i] = {static_cast<float>(x * oscillator.real()),
+                 static_cast<float>(x * oscillator.imag())};
+    oscillator = multiply(oscillator, rotation_);
   }
   // Renormalise once per block so rounding cannot make the amplitude drift.
   oscillator_ = oscillator / std::abs(oscillator);

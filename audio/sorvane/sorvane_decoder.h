@@ -169,6 +169,9 @@ class SorvaneDecoder {
   int max_good_block_size_ = 0;
   double input_per_baseband_ = 1.0;
   std::complex<double> rotation_{1.0, 0.0};
+  static constexpr int kMixLanes = 8;
+  std::complex<double> mix_rotations_[kMixLanes];  // rotation_^k
+  std::complex<double> mix_step_{1.0, 0.0};         // rotation_^kMixLanes
   std::complex<double> oscillator_{1.0, 0.0};
   std::unique_ptr<audio_dsp::RationalFactorResampler<std::complex<float>>> baseband_resampler_;
   bool initialized_ = false;
