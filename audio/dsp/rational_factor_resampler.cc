@@ -2,7 +2,9 @@
 
 #include <cmath>
 #include <cstdint>
+#include <type_traits>
 
+#include "audio/dsp/float4.h"
 #include "audio/dsp/number_util.h"
 
 namespace audio_dsp {
@@ -21,24 +23,30 @@ inline float Dot(const float* taps, const float* s, int num_taps) {
   return (sum[0] + sum[1]) + (sum[2] + sum[3]);
 }
 
-inline std::complex<float> Dot(const float* taps, const std::complex<float>* s,
+// The complex form reads `paired_taps`, each tap written twice (t0 t0 t1 t1
+// ...), so that four lanes multiply two interleaved re/im samples at once:
+// even lanes sum the real parts, odd lanes the imaginary ones.
+inline std::complex<float> Dot(const float* paired_taps, const std::complex<float>* s,
                                int num_taps) {
-  // Interleaved re/im pairs; two partial sums per part.
   const float* x = reinterpret_cast<const float*>(s);
-  float re[2] = {0.0f, 0.0f};
-  float im[2] = {0.0f, 0.0f};
+  const int n = 2 * num_taps;
+  Float4 a = {}, b = {};
   int m = 0;
-  for (; m + 2 <= num_taps; m += 2) {
-    for (int j = 0; j < 2; ++j) {
-      re[j] += taps[m + j] * x[2 * (m + j)];
-      im[j] += taps[m + j] * x[2 * (m + j) + 1];
-    }
+  for (; m + 8 <= n; m += 8) {
+    a += Load4(paired_taps + m) * Load4(x + m);
+    b += Load4(paired_taps + m + 4) * Load4(x + m + 4);
   }
-  for (; m < num_taps; ++m) {
-    re[0] += taps[m] * x[2 * m];
-    im[0] += taps[m] * x[2 * m + 1];
+  if (m + 4 <= n) {
+    a += Load4(paired_taps + m) * Load4(x + m);
+    m += 4;
   }
-  return {re[0] + re[1], im[0] + im[1]};
+  const Float4 sum = a + b;
+  float re = sum[0] + sum[2], im = sum[1] + sum[3];
+  if (m < n) {  // one tap left
+    re += paired_taps[m] * x[m];
+    im += paired_taps[m + 1] * x[m + 1];
+  }
+  return {re, im};
 }
 
 }  // namespace
@@ -61,6 +69,14 @@ RationalFactorResampler<T>::RationalFactorResampler(
     const double offset = static_cast<double>(p) / factor_denominator_;
     for (int j = -radius_; j <= radius_; ++j) {
       filters_[p][radius_ - j] = static_cast<float>(kernel.Eval(j + offset));
+    }
+  }
+  if constexpr (std::is_same_v<T, std::complex<float>>) {
+    dot_filters_.assign(factor_denominator_, std::vector<float>(2 * num_taps_));
+    for (int p = 0; p < factor_denominator_; ++p) {
+      for (int m = 0; m < num_taps_; ++m) {
+        dot_filters_[p][2 * m] = dot_filters_[p][2 * m + 1] = filters_[p][m];
+      }
     }
   }
   valid_ = true;
@@ -91,9 +107,11 @@ void RationalFactorResampler<T>::ProcessSamples(std::span<const T> input,
   output->resize(count);
 
   const T* s = delayed_input_.data();
+  const std::vector<std::vector<float>>& taps =
+      std::is_same_v<T, std::complex<float>> ? dot_filters_ : filters_;
   int64_t i = 0;
   for (int64_t k = 0; k < count; ++k) {
-    (*output)[k] = Dot(filters_[phase_].data(), s + i, num_taps_);
+    (*output)[k] = Dot(taps[phase_].data(), s + i, num_taps_);
     phase_ += fractional_step_;
     i += integer_step_;
     if (phase_ >= factor_denominator_) {

@@ -47,6 +47,9 @@ class RationalFactorResampler : public Resampler<T> {
   int radius_ = 0;
   int num_taps_ = 1;
   std::vector<std::vector<float>> filters_;
+  // For complex samples, the filters with each tap written twice (one per
+  // part), as the inner loop reads them.
+  std::vector<std::vector<float>> dot_filters_;
   // Input not yet consumed, starting at the next output's first tap.
   std::vector<T> delayed_input_;
   int phase_ = 0;
