@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "audio/dsp/box_filter.h"
+#include "audio/dsp/float4.h"
 #include "audio/dsp/number_util.h"
 #include "audio/dsp/resampler.h"
 #include "audio/sorvane/compute_buffer_truncation.h"
@@ -294,7 +295,21 @@ bool SorvaneDecoder::GetToken(DecodeResults* decode_results) {
       params_.num_symbol_periods_to_sum, /*allow_ragged=*/true, &box_workspace_,
       [&](int column, const float* values) {
         const int first = column * frame_size_;
+        // A value counts when it reaches the threshold and is positive;
+        // outside a run, blocks of eight where none counts are skipped
+        // whole (most of the buffer, between broadcasts).
+        const audio_dsp::Float4 floor = audio_dsp::Splat4(threshold);
+        const audio_dsp::Float4 zero = {};
+        const auto none_count = [&](const float* x) {
+          const audio_dsp::Float4 a = audio_dsp::Load4(x), b = audio_dsp::Load4(x + 4);
+          const auto counts = ((a >= floor) & (a > zero)) | ((b >= floor) & (b > zero));
+          return (counts[0] | counts[1] | counts[2] | counts[3]) == 0;
+        };
         for (int r = 0; r < frame_size_; ++r) {
+          if (!in_run) {
+            while (r + 8 <= frame_size_ && none_count(values + r)) r += 8;
+            if (r == frame_size_) break;
+          }
           const float v = values[r] < threshold ? 0.0f : values[r];
           if (v > 0.0f) {
             if (!in_run || v > run_peak.score) run_peak = {first + r, v};
