@@ -1,4 +1,4 @@
-// Four floats as one value, for inner loops that the compiler should keep
+// Four (or eight) floats as one value, for inner loops that the compiler should keep
 // in SIMD registers: GCC and Clang map the arithmetic to SSE on x86 and
 // NEON on ARM, and to scalar code elsewhere. Loads and stores go through
 // memcpy, so pointers need no alignment.
@@ -44,6 +44,29 @@ inline float MaxLane4(Float4 v) {
   const float b = v[2] < v[3] ? v[3] : v[2];
   return a < b ? b : a;
 }
+
+// Eight floats, for loops over many independent lanes (two SSE or NEON
+// registers). Only for inline use inside one translation unit: without AVX
+// its by-value passing differs from an AVX build's, which GCC warns about.
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wpsabi"
+typedef float Float8 __attribute__((vector_size(32)));
+
+inline Float8 Load8(const float* p) {
+  Float8 v;
+  std::memcpy(&v, p, sizeof(v));
+  return v;
+}
+
+inline void Store8(float* p, Float8 v) { std::memcpy(p, &v, sizeof(v)); }
+
+inline Float8 Splat8(float x) { return Float8{x, x, x, x, x, x, x, x}; }
+
+// Lane-wise std::max and std::min (same operand order, so the same result
+// for equal values).
+inline Float8 Max8(Float8 a, Float8 b) { return a < b ? b : a; }
+inline Float8 Min8(Float8 a, Float8 b) { return b < a ? b : a; }
+#pragma GCC diagnostic pop
 
 }  // namespace audio_dsp
 

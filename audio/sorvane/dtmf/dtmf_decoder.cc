@@ -13,8 +13,18 @@
 #include "audio/sorvane/compute_buffer_truncation.h"
 #include "base/logging.h"
 
+// Float8 values stay inside this file's inline code (see float4.h).
+#pragma GCC diagnostic ignored "-Wpsabi"
+
 namespace audio_sorvane {
 namespace {
+
+using audio_dsp::Float8;
+using audio_dsp::Load8;
+using audio_dsp::Max8;
+using audio_dsp::Min8;
+using audio_dsp::Splat8;
+using audio_dsp::Store8;
 
 constexpr double kSpeedOfSound = 340.0;  // m/s
 
@@ -79,7 +89,7 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
       audio_dsp::GammaFilterPoleFromStddev(
           params_.noise_estimate_filter_stddev * baseband_frame_size_, order));
   column_scores_.resize(num_frequencies_);
-  top_.resize(params_.tones_per_symbol);
+  top8_.resize(params_.tones_per_symbol);
   folded_.resize(baseband_frame_size_);
 
   // The coherent path, when the token layout fits the search's limits. The
@@ -175,6 +185,74 @@ std::pair<std::span<const float>, std::span<const float>> ColumnRing::Pieces(
   return {std::span<const float>(base + at, n), std::span<const float>(base, count - n)};
 }
 
+void BlockMaxima::Init(const ColumnRing& values) {
+  CHECK(values.capacity() % kBlock == 0);
+  maxima_.Init(values.rows(), values.capacity() / kBlock);
+}
+
+void BlockMaxima::ComputeBlock(const ColumnRing& values, int64_t block) {
+  // Blocks never straddle the values ring's wrap (capacity % kBlock == 0).
+  for (int r = 0; r < values.rows(); ++r) {
+    const float* v = values.Pieces(r, block * kBlock, kBlock).first.data();
+    float m = v[0];
+    for (int i = 1; i < kBlock; ++i) m = std::max(m, v[i]);
+    maxima_.at(r, block) = m;
+  }
+}
+
+void BlockMaxima::Update(const ColumnRing& values, int64_t from, int64_t to) {
+  for (int64_t block = from / kBlock; (block + 1) * kBlock <= to; ++block) {
+    ComputeBlock(values, block);
+  }
+}
+
+void BlockMaxima::Rebuild(const ColumnRing& values, int64_t from, int64_t to) {
+  Init(values);
+  for (int64_t block = (from + kBlock - 1) / kBlock; (block + 1) * kBlock <= to; ++block) {
+    ComputeBlock(values, block);
+  }
+}
+
+namespace {
+
+// The largest of values [first, first + count) of a row, read in place.
+float RangeMax(const ColumnRing& ring, int row, int64_t first, int count, float m) {
+  const auto [a, b] = ring.Pieces(row, first, count);
+  for (const std::span<const float> piece : {a, b}) {
+    size_t j = 0;
+    if (piece.size() >= 4) {
+      audio_dsp::Float4 v = audio_dsp::Load4(piece.data());
+      for (j = 4; j + 4 <= piece.size(); j += 4) {
+        v = audio_dsp::Max4(v, audio_dsp::Load4(piece.data() + j));
+      }
+      m = std::max(m, audio_dsp::MaxLane4(v));
+    }
+    for (; j < piece.size(); ++j) m = std::max(m, piece[j]);
+  }
+  return m;
+}
+
+}  // namespace
+
+float BlockMaxima::Max(const ColumnRing& values, int row, int64_t first, int64_t last) const {
+  const int64_t first_block = (first + kBlock - 1) / kBlock;
+  const int64_t end_block = (last + 1) / kBlock;  // past the last whole block
+  if (first_block >= end_block) {
+    return RangeMax(values, row, first, static_cast<int>(last - first + 1), -INFINITY);
+  }
+  float m = RangeMax(maxima_, row, first_block, static_cast<int>(end_block - first_block),
+                     -INFINITY);
+  m = RangeMax(values, row, first, static_cast<int>(first_block * kBlock - first), m);
+  return RangeMax(values, row, end_block * kBlock, static_cast<int>(last + 1 - end_block * kBlock),
+                  m);
+}
+
+float BlockMaxima::MaxReference(const ColumnRing& values, int row, int64_t first, int64_t last) {
+  float m = -INFINITY;
+  for (int64_t p = first; p <= last; ++p) m = std::max(m, values.at(row, p));
+  return m;
+}
+
 void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   CHECK(received_sample_rate > 0.0);
   CHECK(num_channels >= 1);
@@ -198,9 +276,11 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   tone_bank_->Reset();
   // The buffers hold at most the budget's worth of baseband samples (see
   // ProcessSamples); a little more covers the resampler's rounding.
-  const int capacity =
-      static_cast<int>(std::ceil(max_buffer_size_ / received_per_baseband_)) + 64;
+  const int capacity = audio_dsp::RoundUpToMultiple(
+      static_cast<int>(std::ceil(max_buffer_size_ / received_per_baseband_)) + 64,
+      BlockMaxima::kBlock);
   strengths_.Init(num_frequencies_, capacity);
+  strength_blocks_.Init(strengths_);
   columns_.Init(2, capacity);
   acquisition_.reserve(capacity);
   last_search_end_ = -1;
@@ -291,13 +371,16 @@ void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
       mono, bank_strength_rows_.data(), search_supported_ ? bank_sum_rows_.data() : nullptr);
   const int64_t end = begin_ + tone_strength_buffer_size_;
   if (tone_strength_buffer_size_ + added > strengths_.capacity()) {
-    const int capacity = 2 * (tone_strength_buffer_size_ + added);
+    const int capacity = audio_dsp::RoundUpToMultiple(2 * (tone_strength_buffer_size_ + added),
+                                                      BlockMaxima::kBlock);
     strengths_.Reserve(capacity, begin_, end);
+    strength_blocks_.Rebuild(strengths_, begin_, end);
     columns_.Reserve(capacity, columns_begin_, columns_begin_ + columns_length_);
   }
   for (int i = 0; i < num_frequencies_; ++i) {
     strengths_.Write(i, end, bank_strength_rows_[i], added);
   }
+  strength_blocks_.Update(strengths_, end, end + added);
   if (search_supported_) TrackFrames(added);
   tone_strength_buffer_size_ += added;
 }
@@ -389,19 +472,20 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
   const int ahead = std::max(window - 1, 0) / 2;
   const int rows = num_frequencies_;
   constexpr int kChunk = 1024;
-  const int span_max = kChunk + window;
+  // Rows padded by 8 floats so a group of eight columns can always be
+  // loaded whole.
+  const int span_max = kChunk + window + 8;
   if (chunk_raw_.size() < static_cast<size_t>(span_max) * rows) {
     chunk_raw_.resize(static_cast<size_t>(span_max) * rows);
     chunk_local_.resize(span_max);
     max_scratch_.resize(2 * static_cast<size_t>(span_max));
     chunk_levels_.resize(static_cast<size_t>(kChunk) * rows);
-    strongest_.resize(kChunk);
     chunk_signal_.resize(kChunk);
     chunk_noise_.resize(kChunk);
   }
   const int k = num_frequencies_ - params_.tones_per_symbol;
   const int top_count = params_.tones_per_symbol;
-  float* top = top_.data();
+  Float8* top = top8_.data();
   for (int c0 = first; c0 < last; c0 += kChunk) {
     const int c1 = std::min(last, c0 + kChunk);
     const int count = c1 - c0;
@@ -417,41 +501,81 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
       audio_dsp::MaxFilter(raw, span, window, chunk_local_.data(), max_scratch_.data());
       std::copy_n(chunk_local_.data() + offset, count, chunk_levels_.data() + i * kChunk);
     }
-    std::copy_n(chunk_levels_.data(), count, strongest_.data());
-    for (int i = 1; i < rows; ++i) {
-      const float* levels = chunk_levels_.data() + i * kChunk;
-      for (int t = 0; t < count; ++t) strongest_[t] = std::max(strongest_[t], levels[t]);
-    }
-    // With few tones per symbol, keeping the strongest ones in a small
-    // sorted array is cheaper than a partial sort of every column.
-    for (int t = 0; t < count; ++t) {
-      std::fill(top, top + top_count, -INFINITY);  // descending
-      float sum = 0.0f;
+    // Per column: the strongest local level, the normalised tones, their
+    // sum and the tones_per_symbol largest (kept sorted by a max / min
+    // exchange, which yields the same values as an insertion). Eight
+    // columns at a time in the lanes of a Float8; a column's arithmetic is
+    // the same, in the same order, as done one column at a time.
+    const Float8 weight = Splat8(norm.cross_frequency_weight);
+    const Float8 floor = Splat8(norm.division_floor);
+    const auto column_group = [&](int t, Float8* signal, Float8* noise) {
+      Float8 strongest = Load8(chunk_levels_.data() + t);
+      for (int i = 1; i < rows; ++i) strongest = Max8(strongest, Load8(chunk_levels_.data() + i * kChunk + t));
+      for (int j = 0; j < top_count; ++j) top[j] = Splat8(-INFINITY);  // descending
+      Float8 sum = Splat8(0.0f);
       for (int i = 0; i < rows; ++i) {
-        const float level = chunk_levels_[i * kChunk + t];
-        const float v =
-            chunk_raw_[static_cast<size_t>(i) * span_max + offset + t] /
-            (level + norm.cross_frequency_weight * (strongest_[t] - level) + norm.division_floor);
+        const Float8 level = Load8(chunk_levels_.data() + i * kChunk + t);
+        Float8 v = Load8(chunk_raw_.data() + static_cast<size_t>(i) * span_max + offset + t) /
+                   (level + weight * (strongest - level) + floor);
         sum += v;
-        if (v > top[top_count - 1]) {
-          int j = top_count - 1;
-          for (; j > 0 && top[j - 1] < v; --j) top[j] = top[j - 1];
-          top[j] = v;
+        for (int j = 0; j < top_count; ++j) {
+          const Float8 high = Max8(top[j], v);
+          v = Min8(top[j], v);
+          top[j] = high;
         }
       }
-      float top_sum = 0.0f;
+      Float8 top_sum = Splat8(0.0f);
       for (int j = 0; j < top_count; ++j) top_sum += top[j];
-      chunk_signal_[t] = top[top_count - 1];  // the k-th smallest value
-      chunk_noise_[t] = k > 0 ? (sum - top_sum) / static_cast<float>(k) : 0.0f;
+      *signal = top[top_count - 1];  // the k-th smallest value
+      *noise = k > 0 ? (sum - top_sum) / Splat8(static_cast<float>(k)) : Splat8(0.0f);
+    };
+    int t = 0;
+    for (; t + 8 <= count; t += 8) {
+      Float8 signal, noise;
+      column_group(t, &signal, &noise);
+      Store8(chunk_signal_.data() + t, signal);
+      Store8(chunk_noise_.data() + t, noise);
+    }
+    if (t < count) {
+      // The last few columns through a padded group (the lanes past
+      // `count` read scratch values and are not kept).
+      Float8 signal, noise;
+      column_group(t, &signal, &noise);
+      for (int l = 0; t + l < count; ++l) {
+        chunk_signal_[t + l] = signal[l];
+        chunk_noise_[t + l] = noise[l];
+      }
     }
     columns_.Write(0, begin_ + c0, chunk_signal_.data(), count);
     columns_.Write(1, begin_ + c0, chunk_noise_.data(), count);
   }
 }
 
-// The normalised scores of every tone at buffer column t: the local levels
-// are the maxima over the column's clipped window, read directly.
+// The normalised scores of every tone at buffer column t; the local levels
+// are the maxima over the column's clipped window.
 void DtmfDecoder::ToneScoresAt(int t) {
+  const ToneNormalizationParams& norm = params_.tone_normalization_params;
+  const int length = tone_strength_buffer_size_;
+  const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
+  const int ahead = std::max(window - 1, 0) / 2;
+  const int lo = std::max(0, t + ahead - window + 1);
+  const int hi = std::min(length - 1, t + ahead);
+  float strongest = -INFINITY;
+  for (int i = 0; i < num_frequencies_; ++i) {
+    const float level = strength_blocks_.Max(strengths_, i, begin_ + lo, begin_ + hi);
+    column_scores_[i] = level;
+    strongest = std::max(strongest, level);
+  }
+  for (int i = 0; i < num_frequencies_; ++i) {
+    const float level = column_scores_[i];
+    column_scores_[i] = strengths_.at(i, begin_ + t) /
+                        (level + norm.cross_frequency_weight * (strongest - level) +
+                         norm.division_floor);
+  }
+}
+
+// ToneScoresAt with every value of the windows read directly.
+void DtmfDecoder::ToneScoresAtReference(int t) {
   const ToneNormalizationParams& norm = params_.tone_normalization_params;
   const int length = tone_strength_buffer_size_;
   const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
@@ -525,7 +649,10 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   // Symbol timing: the phase of the acquisition folded over whole periods.
   const int period = baseband_frame_size_;
   std::fill(folded_.begin(), folded_.end(), 0.0);
-  for (int p = 0; p < (length / period) * period; ++p) folded_[p % period] += acquisition_scores[p];
+  for (int k = 0; k < length / period; ++k) {
+    const float* scores = acquisition_scores.data() + static_cast<size_t>(k) * period;
+    for (int p = 0; p < period; ++p) folded_[p] += scores[p];
+  }
   const std::complex<double> step = std::polar(1.0, 2.0 * std::numbers::pi / period);
   std::complex<double> phasor(1.0, 0.0), sum;
   for (int p = 0; p < period; ++p) {
@@ -547,7 +674,11 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
                                        acquisition_scores[t + period]));
     }
     if (score < params_.acquisition_threshold) continue;
-    ToneScoresAt(t);
+    if (params_.use_reference_paths) {
+      ToneScoresAtReference(t);
+    } else {
+      ToneScoresAt(t);
+    }
     slot_scores_.resize(alphabet);
     for (int s = 0; s < alphabet; ++s) {
       float weakest = INFINITY;
