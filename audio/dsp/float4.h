@@ -45,28 +45,33 @@ inline float MaxLane4(Float4 v) {
   return a < b ? b : a;
 }
 
-// Eight floats, for loops over many independent lanes (two SSE or NEON
-// registers). Only for inline use inside one translation unit: without AVX
-// its by-value passing differs from an AVX build's, which GCC warns about.
-#pragma GCC diagnostic push
-#pragma GCC diagnostic ignored "-Wpsabi"
-typedef float Float8 __attribute__((vector_size(32)));
+// Eight floats as two Float4 halves, for loops over many independent lanes
+// (a plain 32-byte vector type lowers poorly without AVX: its comparisons
+// become scalar code).
+struct Float8 {
+  Float4 lo, hi;
+  float operator[](int lane) const { return lane < 4 ? lo[lane] : hi[lane - 4]; }
+};
 
-inline Float8 Load8(const float* p) {
-  Float8 v;
-  std::memcpy(&v, p, sizeof(v));
-  return v;
+inline Float8 Load8(const float* p) { return {Load4(p), Load4(p + 4)}; }
+inline void Store8(float* p, Float8 v) {
+  Store4(p, v.lo);
+  Store4(p + 4, v.hi);
 }
-
-inline void Store8(float* p, Float8 v) { std::memcpy(p, &v, sizeof(v)); }
-
-inline Float8 Splat8(float x) { return Float8{x, x, x, x, x, x, x, x}; }
-
+inline Float8 Splat8(float x) { return {Splat4(x), Splat4(x)}; }
+inline Float8 operator+(Float8 a, Float8 b) { return {a.lo + b.lo, a.hi + b.hi}; }
+inline Float8 operator-(Float8 a, Float8 b) { return {a.lo - b.lo, a.hi - b.hi}; }
+inline Float8 operator*(Float8 a, Float8 b) { return {a.lo * b.lo, a.hi * b.hi}; }
+inline Float8 operator/(Float8 a, Float8 b) { return {a.lo / b.lo, a.hi / b.hi}; }
+inline Float8& operator+=(Float8& a, Float8 b) { return a = a + b; }
 // Lane-wise std::max and std::min (same operand order, so the same result
 // for equal values).
-inline Float8 Max8(Float8 a, Float8 b) { return a < b ? b : a; }
-inline Float8 Min8(Float8 a, Float8 b) { return b < a ? b : a; }
-#pragma GCC diagnostic pop
+inline Float8 Max8(Float8 a, Float8 b) {
+  return {a.lo < b.lo ? b.lo : a.lo, a.hi < b.hi ? b.hi : a.hi};
+}
+inline Float8 Min8(Float8 a, Float8 b) {
+  return {b.lo < a.lo ? b.lo : a.lo, b.hi < a.hi ? b.hi : a.hi};
+}
 
 }  // namespace audio_dsp
 

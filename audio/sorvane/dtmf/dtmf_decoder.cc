@@ -13,9 +13,6 @@
 #include "audio/sorvane/compute_buffer_truncation.h"
 #include "base/logging.h"
 
-// Float8 values stay inside this file's inline code (see float4.h).
-#pragma GCC diagnostic ignored "-Wpsabi"
-
 namespace audio_sorvane {
 namespace {
 
