@@ -1,7 +1,6 @@
 #include "audio/sorvane/token_selector.h"
 
 #include <algorithm>
-#include <functional>
 #include <tuple>
 
 #include "audio/dsp/batch_top_n.h"
@@ -95,13 +94,13 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
   }
 
   // Prune the weakest runners-up until few enough combinations remain. The
-  // best entry of each column always stays. (A min-heap on the value, then
-  // row and column.)
+  // best entry of each column always stays. Runners-up go in ascending
+  // (value, row, column) order: the order a min-heap would pop them in
+  // (entries are distinct), for the price of one sort.
   const int limit = params_.max_candidates_to_consider;
   s.counts.assign(period, 0);
   std::vector<Entry>& runners_up = s.runners_up;
   runners_up.clear();
-  const auto heap_order = std::greater<Entry>();
   for (int c = 0; c < period; ++c) {
     int best = 0;
     for (int r = 0; r < rows; ++r) {
@@ -111,10 +110,7 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
       const float v = (*scores_table)(r, c);
       if (v > 0.0f) {
         ++s.counts[c];
-        if (r != best) {
-          runners_up.emplace_back(v, r, c);
-          std::push_heap(runners_up.begin(), runners_up.end(), heap_order);
-        }
+        if (r != best) runners_up.emplace_back(v, r, c);
       }
     }
   }
@@ -123,12 +119,13 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
     for (int count : s.counts) product = std::min<int64_t>(product * count, limit + 1);
     return product;
   };
-  while (combinations() > limit && !runners_up.empty()) {
-    std::pop_heap(runners_up.begin(), runners_up.end(), heap_order);
-    const auto [value, r, c] = runners_up.back();
-    runners_up.pop_back();
-    (*scores_table)(r, c) = 0.0f;
-    --s.counts[c];
+  if (combinations() > limit) {
+    std::sort(runners_up.begin(), runners_up.end());
+    for (const auto& [value, r, c] : runners_up) {
+      (*scores_table)(r, c) = 0.0f;
+      --s.counts[c];
+      if (combinations() <= limit) break;
+    }
   }
 
   // Enumerate the combinations as an odometer, column 0 fastest; the best

@@ -390,11 +390,18 @@ void DtmfDecoder::TrackFrames(int count) {
   const int max_frames = params_.room_search.max_frames;
   for (int n = 0; n < count; ++n) {
     const int64_t j = block_position_++;
-    const std::complex<double> w = window_twiddles_[j % (2 * period)];
+    // running_a += w z and running_b += conj(w) z, written out: the
+    // operators' NaN handling keeps them from vectorising.
+    const double w_re = window_twiddles_[j % (2 * period)].real();
+    const double w_im = window_twiddles_[j % (2 * period)].imag();
+    double* a_sums = reinterpret_cast<double*>(running_a_.data());
+    double* b_sums = reinterpret_cast<double*>(running_b_.data());
     for (int k = 0; k < tones; ++k) {
-      const std::complex<double> z(bank_sum_rows_[k][n]);
-      running_a_[k] += w * z;
-      running_b_[k] += std::conj(w) * z;
+      const double z_re = bank_sum_rows_[k][n].real(), z_im = bank_sum_rows_[k][n].imag();
+      a_sums[2 * k] += w_re * z_re - w_im * z_im;
+      a_sums[2 * k + 1] += w_re * z_im + w_im * z_re;
+      b_sums[2 * k] += w_re * z_re + w_im * z_im;
+      b_sums[2 * k + 1] += w_re * z_im - w_im * z_re;
     }
     const int c = candidate_at_[(j + 1) % period];
     if (c < 0) continue;
@@ -409,9 +416,9 @@ void DtmfDecoder::TrackFrames(int count) {
           &frame_values_[(static_cast<size_t>(c) * max_frames + slot) * tones];
       for (int k = 0; k < tones; ++k) {
         const std::complex<double> sum =
-            (std::conj(turn) * (running_a_[k] - a[k]) - turn * (running_b_[k] - b[k])) /
-            std::complex<double>(0.0, 2.0);
-        out[k] = std::complex<float>(sum);
+            std::conj(turn) * (running_a_[k] - a[k]) - turn * (running_b_[k] - b[k]);
+        // sum / 2i
+        out[k] = std::complex<float>(std::complex<double>(sum.imag() * 0.5, -sum.real() * 0.5));
       }
       frame_starts_[static_cast<size_t>(c) * max_frames + slot] = s;
       frame_next_[c] = (slot + 1) % max_frames;
