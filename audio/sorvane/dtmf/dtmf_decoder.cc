@@ -212,42 +212,60 @@ void BlockMaxima::Rebuild(const ColumnRing& values, int64_t from, int64_t to) {
 
 namespace {
 
-// The largest of values [first, first + count) of a row, read in place.
-float RangeMax(const ColumnRing& ring, int row, int64_t first, int count, float m) {
-  const auto [a, b] = ring.Pieces(row, first, count);
-  for (const std::span<const float> piece : {a, b}) {
-    size_t j = 0;
-    if (piece.size() >= 4) {
-      audio_dsp::Float4 v = audio_dsp::Load4(piece.data());
-      for (j = 4; j + 4 <= piece.size(); j += 4) {
-        v = audio_dsp::Max4(v, audio_dsp::Load4(piece.data() + j));
-      }
-      m = std::max(m, audio_dsp::MaxLane4(v));
+// The largest of `count` values from `values` on, with a ring wrap after
+// `before_wrap` of them, folded into m.
+float RangeMax(const float* values, int before_wrap, const float* wrapped, int count, float m) {
+  for (int piece = 0; piece < 2 && count > 0; ++piece) {
+    const float* v = piece == 0 ? values : wrapped;
+    const int n = piece == 0 ? std::min(count, before_wrap) : count;
+    int j = 0;
+    if (n >= 4) {
+      audio_dsp::Float4 a = audio_dsp::Load4(v);
+      for (j = 4; j + 4 <= n; j += 4) a = audio_dsp::Max4(a, audio_dsp::Load4(v + j));
+      m = std::max(m, audio_dsp::MaxLane4(a));
     }
-    for (; j < piece.size(); ++j) m = std::max(m, piece[j]);
+    for (; j < n; ++j) m = std::max(m, v[j]);
+    count -= n;
   }
   return m;
 }
 
 }  // namespace
 
-float BlockMaxima::Max(const ColumnRing& values, int row, int64_t first, int64_t last) const {
+// [first, last] = head values, whole blocks, tail values; the ring offsets
+// are the same for every row.
+void BlockMaxima::Max(const ColumnRing& values, int64_t first, int64_t last,
+                      float* maxima) const {
+  const int capacity = values.capacity();
+  const int block_capacity = maxima_.capacity();
   const int64_t first_block = (first + kBlock - 1) / kBlock;
   const int64_t end_block = (last + 1) / kBlock;  // past the last whole block
-  if (first_block >= end_block) {
-    return RangeMax(values, row, first, static_cast<int>(last - first + 1), -INFINITY);
+  const bool has_blocks = first_block < end_block;
+  const int head = has_blocks ? static_cast<int>(first_block * kBlock - first)
+                              : static_cast<int>(last - first + 1);
+  const int blocks = has_blocks ? static_cast<int>(end_block - first_block) : 0;
+  const int64_t tail_first = has_blocks ? end_block * kBlock : last + 1;
+  const int tail = static_cast<int>(last + 1 - tail_first);
+  const int head_at = static_cast<int>(first % capacity);
+  const int tail_at = static_cast<int>(tail_first % capacity);
+  const int block_at = static_cast<int>(first_block % block_capacity);
+  for (int r = 0; r < values.rows(); ++r) {
+    const float* row = values.row(r);
+    const float* block_row = maxima_.row(r);
+    float m = RangeMax(block_row + block_at, block_capacity - block_at, block_row, blocks,
+                       -INFINITY);
+    m = RangeMax(row + head_at, capacity - head_at, row, head, m);
+    maxima[r] = RangeMax(row + tail_at, capacity - tail_at, row, tail, m);
   }
-  float m = RangeMax(maxima_, row, first_block, static_cast<int>(end_block - first_block),
-                     -INFINITY);
-  m = RangeMax(values, row, first, static_cast<int>(first_block * kBlock - first), m);
-  return RangeMax(values, row, end_block * kBlock, static_cast<int>(last + 1 - end_block * kBlock),
-                  m);
 }
 
-float BlockMaxima::MaxReference(const ColumnRing& values, int row, int64_t first, int64_t last) {
-  float m = -INFINITY;
-  for (int64_t p = first; p <= last; ++p) m = std::max(m, values.at(row, p));
-  return m;
+void BlockMaxima::MaxReference(const ColumnRing& values, int64_t first, int64_t last,
+                               float* maxima) {
+  for (int r = 0; r < values.rows(); ++r) {
+    float m = -INFINITY;
+    for (int64_t p = first; p <= last; ++p) m = std::max(m, values.at(r, p));
+    maxima[r] = m;
+  }
 }
 
 void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
@@ -280,6 +298,12 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   strength_blocks_.Init(strengths_);
   columns_.Init(2, capacity);
   acquisition_.reserve(capacity);
+  for (SlotCache* cache : {&slot_cache_, &next_slot_cache_}) {
+    cache->positions.clear();
+    cache->scores.clear();
+    cache->positions.reserve(capacity / baseband_frame_size_ + 2);
+    cache->scores.reserve(cache->positions.capacity() * num_frequencies_);
+  }
   last_search_end_ = -1;
   columns_begin_ = 0;
   columns_length_ = 0;
@@ -557,58 +581,24 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
 
 // The normalised scores of every tone at buffer column t; the local levels
 // are the maxima over the column's clipped window.
-void DtmfDecoder::ToneScoresAt(int t) {
+void DtmfDecoder::ToneScoresAt(int t, float* scores) const {
   const ToneNormalizationParams& norm = params_.tone_normalization_params;
   const int length = tone_strength_buffer_size_;
   const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
   const int ahead = std::max(window - 1, 0) / 2;
   const int lo = std::max(0, t + ahead - window + 1);
   const int hi = std::min(length - 1, t + ahead);
+  if (params_.use_reference_paths) {
+    BlockMaxima::MaxReference(strengths_, begin_ + lo, begin_ + hi, scores);
+  } else {
+    strength_blocks_.Max(strengths_, begin_ + lo, begin_ + hi, scores);
+  }
   float strongest = -INFINITY;
+  for (int i = 0; i < num_frequencies_; ++i) strongest = std::max(strongest, scores[i]);
   for (int i = 0; i < num_frequencies_; ++i) {
-    const float level = strength_blocks_.Max(strengths_, i, begin_ + lo, begin_ + hi);
-    column_scores_[i] = level;
-    strongest = std::max(strongest, level);
-  }
-  for (int i = 0; i < num_frequencies_; ++i) {
-    const float level = column_scores_[i];
-    column_scores_[i] = strengths_.at(i, begin_ + t) /
-                        (level + norm.cross_frequency_weight * (strongest - level) +
-                         norm.division_floor);
-  }
-}
-
-// ToneScoresAt with every value of the windows read directly.
-void DtmfDecoder::ToneScoresAtReference(int t) {
-  const ToneNormalizationParams& norm = params_.tone_normalization_params;
-  const int length = tone_strength_buffer_size_;
-  const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
-  const int ahead = std::max(window - 1, 0) / 2;
-  const int lo = std::max(0, t + ahead - window + 1);
-  const int hi = std::min(length - 1, t + ahead);
-  float strongest = -INFINITY;
-  for (int i = 0; i < num_frequencies_; ++i) {
-    const auto [a, b] = strengths_.Pieces(i, begin_ + lo, hi - lo + 1);
-    float level = -INFINITY;
-    for (const std::span<const float> piece : {a, b}) {
-      size_t j = 0;
-      if (piece.size() >= 4) {
-        audio_dsp::Float4 m = audio_dsp::Load4(piece.data());
-        for (j = 4; j + 4 <= piece.size(); j += 4) {
-          m = audio_dsp::Max4(m, audio_dsp::Load4(piece.data() + j));
-        }
-        level = std::max(level, audio_dsp::MaxLane4(m));
-      }
-      for (; j < piece.size(); ++j) level = std::max(level, piece[j]);
-    }
-    column_scores_[i] = level;
-    strongest = std::max(strongest, level);
-  }
-  for (int i = 0; i < num_frequencies_; ++i) {
-    const float level = column_scores_[i];
-    column_scores_[i] = strengths_.at(i, begin_ + t) /
-                        (level + norm.cross_frequency_weight * (strongest - level) +
-                         norm.division_floor);
+    const float level = scores[i];
+    scores[i] = strengths_.at(i, begin_ + t) /
+                (level + norm.cross_frequency_weight * (strongest - level) + norm.division_floor);
   }
 }
 
@@ -671,6 +661,12 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   CHECK(acquisition_scores.size() == static_cast<size_t>(tone_strength_buffer_size_));
   const int alphabet = static_cast<int>(params_.symbol_table.size());
   const float discarded_seconds = static_cast<float>(begin_) / baseband_sample_rate_;
+  const int window = static_cast<int>(params_.tone_normalization_params.window_size * period);
+  const int ahead = std::max(window - 1, 0) / 2;
+  const size_t tones = static_cast<size_t>(num_frequencies_);
+  size_t cached = 0;
+  next_slot_cache_.positions.clear();
+  next_slot_cache_.scores.clear();
   for (int slot = 0, t = t0; t < length; ++slot, t += period) {
     float score = acquisition_scores[t];
     if (t > period && t + period < length) {
@@ -678,10 +674,23 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
                                        acquisition_scores[t + period]));
     }
     if (score < params_.acquisition_threshold) continue;
-    if (params_.use_reference_paths) {
-      ToneScoresAtReference(t);
+    // Scores of a slot whose window lies inside the buffer come from the
+    // last request when it computed them; the values are the same.
+    const int64_t position = begin_ + t;
+    const bool inside = t + ahead - window + 1 >= 0 && t + ahead <= length - 1;
+    while (cached < slot_cache_.positions.size() && slot_cache_.positions[cached] < position) {
+      ++cached;
+    }
+    if (inside && !params_.use_reference_paths && cached < slot_cache_.positions.size() &&
+        slot_cache_.positions[cached] == position) {
+      std::copy_n(slot_cache_.scores.data() + cached * tones, tones, column_scores_.data());
     } else {
-      ToneScoresAt(t);
+      ToneScoresAt(t, column_scores_.data());
+    }
+    if (inside) {
+      next_slot_cache_.positions.push_back(position);
+      next_slot_cache_.scores.insert(next_slot_cache_.scores.end(), column_scores_.begin(),
+                                     column_scores_.end());
     }
     slot_scores_.resize(alphabet);
     for (int s = 0; s < alphabet; ++s) {
@@ -697,6 +706,7 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   // The selector fills the candidate list in place; those of the right
   // length are kept, in order.
   std::vector<DecodedToken>& candidates = decode_results->tokens;
+  std::swap(slot_cache_, next_slot_cache_);
   token_selector_->SelectTokens(decode_results->symbol_scores, &decode_results->scores_table,
                                 &candidates);
   size_t kept = 0;

@@ -101,7 +101,8 @@ struct DtmfDecoderParams : DtmfEncoderParams {
   // Runs the tone filters, the noise smoother and the slots' local levels
   // in their direct reference forms (ToneStrengthFilter::
   // ProcessSamplesReference, AlignedGammaSmoother::SmoothReference,
-  // DtmfDecoder::ToneScoresAtReference) instead of the fast ones; for tests.
+  // BlockMaxima::MaxReference, no slot cache) instead of the fast ones; for
+  // tests.
   bool use_reference_paths = false;
 };
 
@@ -115,6 +116,8 @@ class ColumnRing {
   void Reserve(int capacity, int64_t from, int64_t to);
   int rows() const { return rows_; }
   int capacity() const { return capacity_; }
+  // Row r in ring order (position p at p mod capacity).
+  const float* row(int r) const { return data_.data() + static_cast<size_t>(r) * capacity_; }
   float& at(int row, int64_t position) {
     return data_[static_cast<size_t>(row) * capacity_ + static_cast<size_t>(position % capacity_)];
   }
@@ -151,9 +154,11 @@ class BlockMaxima {
   void Update(const ColumnRing& values, int64_t from, int64_t to);
   // Recomputes every block inside [from, to) (after the values ring grew).
   void Rebuild(const ColumnRing& values, int64_t from, int64_t to);
-  // The largest value of `row` over positions [first, last], first <= last.
-  float Max(const ColumnRing& values, int row, int64_t first, int64_t last) const;
-  static float MaxReference(const ColumnRing& values, int row, int64_t first, int64_t last);
+  // The largest value of every row over positions [first, last] (first <=
+  // last), one per row into `maxima`.
+  void Max(const ColumnRing& values, int64_t first, int64_t last, float* maxima) const;
+  static void MaxReference(const ColumnRing& values, int64_t first, int64_t last,
+                           float* maxima);
 
  private:
   void ComputeBlock(const ColumnRing& values, int64_t block);
@@ -198,11 +203,10 @@ class DtmfDecoder {
   // computing only the columns that changed (see the .cc).
   void UpdateColumnScores();
   void ComputeColumns(int first, int last);
-  // The normalised tone scores of buffer column t, into column_scores_:
-  // local levels from the block maxima, or (Reference) by scanning every
-  // value of the window. Equal results.
-  void ToneScoresAt(int t);
-  void ToneScoresAtReference(int t);
+  // The normalised tone scores of buffer column t, into `scores`: local
+  // levels from the block maxima (BlockMaxima::MaxReference, the direct
+  // scan, on the reference paths). Equal results.
+  void ToneScoresAt(int t, float* scores) const;
   // Running windowed sums of the block sums for the coherent path: the
   // matched-filter output of every frame of every timing candidate, as it
   // completes.
@@ -286,6 +290,14 @@ class DtmfDecoder {
   std::vector<float> chunk_signal_, chunk_noise_;
   std::vector<float> column_scores_, acquisition_;
   audio_dsp::FloatVector slot_scores_;    // one slot's symbol scores
+  // Tone scores of the slots of the last GetToken whose windows lay inside
+  // the buffer, by stream position (ascending), and those of the current
+  // one: a slot whose window still lies inside has the same scores.
+  struct SlotCache {
+    std::vector<int64_t> positions;
+    std::vector<float> scores;  // num_frequencies_ per position
+  };
+  SlotCache slot_cache_, next_slot_cache_;
   std::vector<DecodedToken> rejected_;    // candidates of the wrong length
   mutable std::vector<double> repeat_scratch_;  // LoopRepeats' strengths
   std::vector<double> folded_;
