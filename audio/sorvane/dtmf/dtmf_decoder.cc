@@ -7,7 +7,6 @@
 
 #include "audio/dsp/float4.h"
 #include "audio/dsp/gamma_filter.h"
-#include "audio/dsp/max_filter.h"
 #include "audio/dsp/number_util.h"
 #include "audio/dsp/resampler.h"
 #include "audio/sorvane/compute_buffer_truncation.h"
@@ -297,7 +296,7 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   strengths_.Init(num_frequencies_, capacity);
   strength_blocks_.Init(strengths_);
   columns_.Init(2, capacity);
-  acquisition_.reserve(capacity);
+  acquisition_.reserve(smoother_->PaddedLength(capacity));
   for (SlotCache* cache : {&slot_cache_, &next_slot_cache_}) {
     cache->positions.clear();
     cache->scores.clear();
@@ -496,38 +495,54 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
   if (first >= last) return;
   const ToneNormalizationParams& norm = params_.tone_normalization_params;
   const int length = tone_strength_buffer_size_;
-  const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
-  const int ahead = std::max(window - 1, 0) / 2;
+  const int window_size = static_cast<int>(norm.window_size * baseband_frame_size_);
+  CHECK(window_size >= 1);  // as the running-maximum filter checks it
+  const int window = window_size;
+  const int ahead = (window - 1) / 2;
+  const int back = window - 1 - ahead;
   const int rows = num_frequencies_;
-  constexpr int kChunk = 1024;
-  // Rows padded by 8 floats so a group of eight columns can always be
-  // loaded whole.
-  const int span_max = kChunk + window + 8;
-  if (chunk_raw_.size() < static_cast<size_t>(span_max) * rows) {
-    chunk_raw_.resize(static_cast<size_t>(span_max) * rows);
-    chunk_local_.resize(span_max);
-    max_scratch_.resize(2 * static_cast<size_t>(span_max));
-    chunk_levels_.resize(static_cast<size_t>(kChunk) * rows);
-    chunk_signal_.resize(kChunk);
-    chunk_noise_.resize(kChunk);
+  // One window's worth of columns per chunk; rows padded by 8 floats so a
+  // group of eight columns can always be loaded whole.
+  const int chunk = window;
+  const int stride = chunk + 8;
+  if (chunk_raw_.size() < static_cast<size_t>(stride) * rows) {
+    chunk_raw_.resize(static_cast<size_t>(stride) * rows);
+    chunk_levels_.resize(static_cast<size_t>(stride) * rows);
+    max_scratch_.resize(2 * static_cast<size_t>(window));
+    chunk_signal_.resize(chunk);
+    chunk_noise_.resize(chunk);
   }
   const int k = num_frequencies_ - params_.tones_per_symbol;
   const int top_count = params_.tones_per_symbol;
   Float8* top = top8_.data();
-  for (int c0 = first; c0 < last; c0 += kChunk) {
-    const int c1 = std::min(last, c0 + kChunk);
+  for (int c0 = first; c0 < last; c0 += chunk) {
+    const int c1 = std::min(last, c0 + chunk);
     const int count = c1 - c0;
-    // The raw strengths every window of these columns can reach.
-    const int from = std::max(0, c0 + ahead - window + 1);
-    const int to = std::min(length, c1 + ahead);
-    const int span = to - from;
-    const int offset = c0 - from;
-    // Local level of every tone (running maximum), and the strongest.
+    const int offset = 0;
+    // Local levels (running maxima over the windows clipped to the buffer)
+    // by blocks of one window (van Herk / Gil-Werman): the windows of these
+    // columns start in block A = [a, a + window) and end in A or in the
+    // next block B, so each is max(suffix of A from its start, prefix of B
+    // to its end). Positions outside the buffer count as -inf, which clips
+    // the windows. Max is exact, so the levels equal a direct scan's.
+    const int a = c0 - back;
+    const int span = window + count - 1;  // A, then B up to the last end
+    const int valid_from = std::clamp(-a, 0, span);
+    const int valid_to = std::clamp(length - a, valid_from, span);
+    float* values = max_scratch_.data();
     for (int i = 0; i < rows; ++i) {
-      float* raw = chunk_raw_.data() + static_cast<size_t>(i) * span_max;
-      strengths_.Read(i, begin_ + from, span, raw);
-      audio_dsp::MaxFilter(raw, span, window, chunk_local_.data(), max_scratch_.data());
-      std::copy_n(chunk_local_.data() + offset, count, chunk_levels_.data() + i * kChunk);
+      std::fill(values, values + valid_from, -INFINITY);
+      strengths_.Read(i, begin_ + a + valid_from, valid_to - valid_from, values + valid_from);
+      std::fill(values + valid_to, values + span, -INFINITY);
+      float* raw = chunk_raw_.data() + static_cast<size_t>(i) * stride;
+      std::copy_n(values + back, count, raw);
+      float m = -INFINITY;
+      for (int p = window - 1; p >= 0; --p) values[p] = m = std::max(m, values[p]);
+      m = -INFINITY;
+      for (int p = window; p < span; ++p) values[p] = m = std::max(m, values[p]);
+      float* levels = chunk_levels_.data() + static_cast<size_t>(i) * stride;
+      levels[0] = values[0];
+      for (int t = 1; t < count; ++t) levels[t] = std::max(values[t], values[window + t - 1]);
     }
     // Per column: the strongest local level, the normalised tones, their
     // sum and the tones_per_symbol largest (kept sorted by a max / min
@@ -538,12 +553,14 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
     const Float8 floor = Splat8(norm.division_floor);
     const auto column_group = [&](int t, Float8* signal, Float8* noise) {
       Float8 strongest = Load8(chunk_levels_.data() + t);
-      for (int i = 1; i < rows; ++i) strongest = Max8(strongest, Load8(chunk_levels_.data() + i * kChunk + t));
+      for (int i = 1; i < rows; ++i) {
+        strongest = Max8(strongest, Load8(chunk_levels_.data() + i * stride + t));
+      }
       for (int j = 0; j < top_count; ++j) top[j] = Splat8(-INFINITY);  // descending
       Float8 sum = Splat8(0.0f);
       for (int i = 0; i < rows; ++i) {
-        const Float8 level = Load8(chunk_levels_.data() + i * kChunk + t);
-        Float8 v = Load8(chunk_raw_.data() + static_cast<size_t>(i) * span_max + offset + t) /
+        const Float8 level = Load8(chunk_levels_.data() + i * stride + t);
+        Float8 v = Load8(chunk_raw_.data() + static_cast<size_t>(i) * stride + offset + t) /
                    (level + weight * (strongest - level) + floor);
         sum += v;
         for (int j = 0; j < top_count; ++j) {
@@ -621,13 +638,17 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
 
   UpdateColumnScores();
   // Smoothed noise, then the acquisition scores in place.
-  acquisition_.resize(length);
+  // acquisition_ has room for the smoother's padding (reserved at Init).
+  acquisition_.resize(smoother_->PaddedLength(length));
   const auto [noise_a, noise_b] = columns_.Pieces(1, begin_, length);
   if (params_.use_reference_paths) {
     smoother_->SmoothReference(noise_a, noise_b, acquisition_.data());
   } else {
-    smoother_->Smooth(noise_a, noise_b, acquisition_.data());
+    std::copy(noise_a.begin(), noise_a.end(), acquisition_.begin());
+    std::copy(noise_b.begin(), noise_b.end(), acquisition_.begin() + noise_a.size());
+    smoother_->SmoothInPlace(acquisition_.data(), length);
   }
+  acquisition_.resize(length);
   {
     const auto [signal_a, signal_b] = columns_.Pieces(0, begin_, length);
     float* acquisition = acquisition_.data();

@@ -285,7 +285,7 @@ class DtmfDecoder {
   int columns_length_ = 0;
   std::unique_ptr<AlignedGammaSmoother> smoother_;
   // Scratch, sized once.
-  std::vector<float> chunk_raw_, chunk_local_, chunk_levels_, max_scratch_;
+  std::vector<float> chunk_raw_, chunk_levels_, max_scratch_;
   std::vector<audio_dsp::Float8> top8_;  // the strongest tones of eight columns
   std::vector<float> chunk_signal_, chunk_noise_;
   std::vector<float> column_scores_, acquisition_;
