@@ -296,7 +296,7 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   strengths_.Init(num_frequencies_, capacity);
   strength_blocks_.Init(strengths_);
   columns_.Init(2, capacity);
-  acquisition_.reserve(smoother_->PaddedLength(capacity));
+  acquisition_.reserve(std::max<size_t>(smoother_->PaddedLength(capacity), ColumnScratchSize()));
   for (SlotCache* cache : {&slot_cache_, &next_slot_cache_}) {
     cache->positions.clear();
     cache->scores.clear();
@@ -491,6 +491,14 @@ void DtmfDecoder::UpdateColumnScores() {
 // Columns [first, last) of the acquisition's signal (the weakest of the
 // tones_per_symbol strongest normalised tones) and unsmoothed noise (the
 // mean of the other tones), in chunks so that the scratch stays small.
+size_t DtmfDecoder::ColumnScratchSize() const {
+  // ComputeColumns' rows of raw values and levels (one window of columns,
+  // padded by 8), its van Herk values, and a chunk's signal and noise.
+  const int window = std::max(
+      static_cast<int>(params_.tone_normalization_params.window_size * baseband_frame_size_), 1);
+  return 2 * static_cast<size_t>(window + 8) * num_frequencies_ + 4 * static_cast<size_t>(window);
+}
+
 void DtmfDecoder::ComputeColumns(int first, int last) {
   if (first >= last) return;
   const ToneNormalizationParams& norm = params_.tone_normalization_params;
@@ -505,13 +513,14 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
   // group of eight columns can always be loaded whole.
   const int chunk = window;
   const int stride = chunk + 8;
-  if (chunk_raw_.size() < static_cast<size_t>(stride) * rows) {
-    chunk_raw_.resize(static_cast<size_t>(stride) * rows);
-    chunk_levels_.resize(static_cast<size_t>(stride) * rows);
-    max_scratch_.resize(2 * static_cast<size_t>(window));
-    chunk_signal_.resize(chunk);
-    chunk_noise_.resize(chunk);
-  }
+  // Scratch in the acquisition buffer, whose values are computed only
+  // after the columns (one buffer instead of two).
+  if (acquisition_.size() < ColumnScratchSize()) acquisition_.resize(ColumnScratchSize());
+  float* const chunk_raw = acquisition_.data();
+  float* const chunk_levels = chunk_raw + static_cast<size_t>(stride) * rows;
+  float* const max_scratch = chunk_levels + static_cast<size_t>(stride) * rows;
+  float* const chunk_signal = max_scratch + 2 * static_cast<size_t>(window);
+  float* const chunk_noise = chunk_signal + chunk;
   const int k = num_frequencies_ - params_.tones_per_symbol;
   const int top_count = params_.tones_per_symbol;
   Float8* top = top8_.data();
@@ -529,18 +538,18 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
     const int span = window + count - 1;  // A, then B up to the last end
     const int valid_from = std::clamp(-a, 0, span);
     const int valid_to = std::clamp(length - a, valid_from, span);
-    float* values = max_scratch_.data();
+    float* values = max_scratch;
     for (int i = 0; i < rows; ++i) {
       std::fill(values, values + valid_from, -INFINITY);
       strengths_.Read(i, begin_ + a + valid_from, valid_to - valid_from, values + valid_from);
       std::fill(values + valid_to, values + span, -INFINITY);
-      float* raw = chunk_raw_.data() + static_cast<size_t>(i) * stride;
+      float* raw = chunk_raw + static_cast<size_t>(i) * stride;
       std::copy_n(values + back, count, raw);
       float m = -INFINITY;
       for (int p = window - 1; p >= 0; --p) values[p] = m = std::max(m, values[p]);
       m = -INFINITY;
       for (int p = window; p < span; ++p) values[p] = m = std::max(m, values[p]);
-      float* levels = chunk_levels_.data() + static_cast<size_t>(i) * stride;
+      float* levels = chunk_levels + static_cast<size_t>(i) * stride;
       levels[0] = values[0];
       for (int t = 1; t < count; ++t) levels[t] = std::max(values[t], values[window + t - 1]);
     }
@@ -552,15 +561,15 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
     const Float8 weight = Splat8(norm.cross_frequency_weight);
     const Float8 floor = Splat8(norm.division_floor);
     const auto column_group = [&](int t, Float8* signal, Float8* noise) {
-      Float8 strongest = Load8(chunk_levels_.data() + t);
+      Float8 strongest = Load8(chunk_levels + t);
       for (int i = 1; i < rows; ++i) {
-        strongest = Max8(strongest, Load8(chunk_levels_.data() + i * stride + t));
+        strongest = Max8(strongest, Load8(chunk_levels + i * stride + t));
       }
       for (int j = 0; j < top_count; ++j) top[j] = Splat8(-INFINITY);  // descending
       Float8 sum = Splat8(0.0f);
       for (int i = 0; i < rows; ++i) {
-        const Float8 level = Load8(chunk_levels_.data() + i * stride + t);
-        Float8 v = Load8(chunk_raw_.data() + static_cast<size_t>(i) * stride + offset + t) /
+        const Float8 level = Load8(chunk_levels + i * stride + t);
+        Float8 v = Load8(chunk_raw + static_cast<size_t>(i) * stride + offset + t) /
                    (level + weight * (strongest - level) + floor);
         sum += v;
         for (int j = 0; j < top_count; ++j) {
@@ -578,8 +587,8 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
     for (; t + 8 <= count; t += 8) {
       Float8 signal, noise;
       column_group(t, &signal, &noise);
-      Store8(chunk_signal_.data() + t, signal);
-      Store8(chunk_noise_.data() + t, noise);
+      Store8(chunk_signal + t, signal);
+      Store8(chunk_noise + t, noise);
     }
     if (t < count) {
       // The last few columns through a padded group (the lanes past
@@ -587,12 +596,12 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
       Float8 signal, noise;
       column_group(t, &signal, &noise);
       for (int l = 0; t + l < count; ++l) {
-        chunk_signal_[t + l] = signal[l];
-        chunk_noise_[t + l] = noise[l];
+        chunk_signal[t + l] = signal[l];
+        chunk_noise[t + l] = noise[l];
       }
     }
-    columns_.Write(0, begin_ + c0, chunk_signal_.data(), count);
-    columns_.Write(1, begin_ + c0, chunk_noise_.data(), count);
+    columns_.Write(0, begin_ + c0, chunk_signal, count);
+    columns_.Write(1, begin_ + c0, chunk_noise, count);
   }
 }
 

@@ -203,6 +203,7 @@ class DtmfDecoder {
   // computing only the columns that changed (see the .cc).
   void UpdateColumnScores();
   void ComputeColumns(int first, int last);
+  size_t ColumnScratchSize() const;
   // The normalised tone scores of buffer column t, into `scores`: local
   // levels from the block maxima (BlockMaxima::MaxReference, the direct
   // scan, on the reference paths). Equal results.
@@ -285,9 +286,7 @@ class DtmfDecoder {
   int columns_length_ = 0;
   std::unique_ptr<AlignedGammaSmoother> smoother_;
   // Scratch, sized once.
-  std::vector<float> chunk_raw_, chunk_levels_, max_scratch_;
   std::vector<audio_dsp::Float8> top8_;  // the strongest tones of eight columns
-  std::vector<float> chunk_signal_, chunk_noise_;
   std::vector<float> column_scores_, acquisition_;
   audio_dsp::FloatVector slot_scores_;    // one slot's symbol scores
   // Tone scores of the slots of the last GetToken whose windows lay inside
