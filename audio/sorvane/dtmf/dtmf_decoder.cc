@@ -106,6 +106,8 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
     }
     const int period = baseband_frame_size_;
     const double phi = std::numbers::pi / period;
+    window_twiddles_.reserve(2 * period);
+    start_twiddles_.reserve(2 * period);
     for (int j = 0; j < 2 * period; ++j) {
       window_twiddles_.push_back(std::polar(1.0, phi * (j + 0.5)));
       start_twiddles_.push_back(std::polar(1.0, phi * j));
@@ -492,11 +494,14 @@ void DtmfDecoder::UpdateColumnScores() {
 // tones_per_symbol strongest normalised tones) and unsmoothed noise (the
 // mean of the other tones), in chunks so that the scratch stays small.
 size_t DtmfDecoder::ColumnScratchSize() const {
-  // ComputeColumns' rows of raw values and levels (one window of columns,
-  // padded by 8), its van Herk values, and a chunk's signal and noise.
+  // ComputeColumns' rows of raw values and levels (half a window of
+  // columns, padded by 8), its van Herk values, and a chunk's signal and
+  // noise.
   const int window = std::max(
       static_cast<int>(params_.tone_normalization_params.window_size * baseband_frame_size_), 1);
-  return 2 * static_cast<size_t>(window + 8) * num_frequencies_ + 4 * static_cast<size_t>(window);
+  const int chunk = (window + 1) / 2;
+  return 2 * static_cast<size_t>(chunk + 8) * num_frequencies_ + 2 * static_cast<size_t>(window) +
+         2 * static_cast<size_t>(chunk);
 }
 
 void DtmfDecoder::ComputeColumns(int first, int last) {
@@ -509,9 +514,10 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
   const int ahead = (window - 1) / 2;
   const int back = window - 1 - ahead;
   const int rows = num_frequencies_;
-  // One window's worth of columns per chunk; rows padded by 8 floats so a
-  // group of eight columns can always be loaded whole.
-  const int chunk = window;
+  // Half a window's worth of columns per chunk (the scratch then fits in
+  // the smoother's share of the buffer); rows padded by 8 floats so a group
+  // of eight columns can always be loaded whole.
+  const int chunk = (window + 1) / 2;
   const int stride = chunk + 8;
   // Scratch in the acquisition buffer, whose values are computed only
   // after the columns (one buffer instead of two).

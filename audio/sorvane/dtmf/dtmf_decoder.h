@@ -146,7 +146,7 @@ class ColumnRing {
 // (CHECK).
 class BlockMaxima {
  public:
-  static constexpr int kBlock = 16;
+  static constexpr int kBlock = 64;
 
   void Init(const ColumnRing& values);
   // Computes the blocks that end in (from, to]: call after writing values
