@@ -551,10 +551,16 @@ void DtmfDecoder::ComputeColumns(int first, int last) {
       std::fill(values + valid_to, values + span, -INFINITY);
       float* raw = chunk_raw + static_cast<size_t>(i) * stride;
       std::copy_n(values + back, count, raw);
-      float m = -INFINITY;
-      for (int p = window - 1; p >= 0; --p) values[p] = m = std::max(m, values[p]);
-      m = -INFINITY;
-      for (int p = window; p < span; ++p) values[p] = m = std::max(m, values[p]);
+      // A's suffix and B's prefix maxima, side by side (two independent
+      // chains).
+      float suffix = -INFINITY, prefix = -INFINITY;
+      const int both = std::min(window, span - window);
+      for (int p = 0; p < both; ++p) {
+        values[window - 1 - p] = suffix = std::max(suffix, values[window - 1 - p]);
+        values[window + p] = prefix = std::max(prefix, values[window + p]);
+      }
+      for (int p = window - 1 - both; p >= 0; --p) values[p] = suffix = std::max(suffix, values[p]);
+      for (int p = window + both; p < span; ++p) values[p] = prefix = std::max(prefix, values[p]);
       float* levels = chunk_levels + static_cast<size_t>(i) * stride;
       levels[0] = values[0];
       for (int t = 1; t < count; ++t) levels[t] = std::max(values[t], values[window + t - 1]);

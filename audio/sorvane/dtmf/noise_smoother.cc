@@ -137,10 +137,12 @@ void AlignedGammaSmoother::SmoothInPlace(float* data, int length) {
       }
     }
     for (int q = 0; q < kLanes; ++q) full[q * segment + i] = in[q / 4][q % 4];
-    for (int q = 0; q < kLanes; ++q) {
-      if (i == lane_length[q] - 1) {
-        for (int k = 0; k < order; ++k) final_state[q][k] = state[k][q / 4][q % 4];
-      }
+  }
+  // The end states of the whole segments (only those are read below; a
+  // short last segment ran on into the padding).
+  for (int q = 0; q < kLanes; ++q) {
+    if (lane_length[q] == segment) {
+      for (int k = 0; k < order; ++k) final_state[q][k] = state[k][q / 4][q % 4];
     }
   }
 
