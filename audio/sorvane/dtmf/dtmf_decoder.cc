@@ -413,12 +413,16 @@ void DtmfDecoder::TrackFrames(int count) {
   const int period = baseband_frame_size_;
   const int tones = num_frequencies_;
   const int max_frames = params_.room_search.max_frames;
-  for (int n = 0; n < count; ++n) {
+  // j mod 2P and (j + 1) mod P, advanced with j.
+  int twiddle = static_cast<int>(block_position_ % (2 * period));
+  int next_phase = static_cast<int>((block_position_ + 1) % period);
+  for (int n = 0; n < count; ++n, twiddle = twiddle + 1 == 2 * period ? 0 : twiddle + 1,
+           next_phase = next_phase + 1 == period ? 0 : next_phase + 1) {
     const int64_t j = block_position_++;
     // running_a += w z and running_b += conj(w) z, written out: the
     // operators' NaN handling keeps them from vectorising.
-    const double w_re = window_twiddles_[j % (2 * period)].real();
-    const double w_im = window_twiddles_[j % (2 * period)].imag();
+    const double w_re = window_twiddles_[twiddle].real();
+    const double w_im = window_twiddles_[twiddle].imag();
     double* a_sums = reinterpret_cast<double*>(running_a_.data());
     double* b_sums = reinterpret_cast<double*>(running_b_.data());
     for (int k = 0; k < tones; ++k) {
@@ -428,7 +432,7 @@ void DtmfDecoder::TrackFrames(int count) {
       b_sums[2 * k] += w_re * z_re + w_im * z_im;
       b_sums[2 * k + 1] += w_re * z_im - w_im * z_re;
     }
-    const int c = candidate_at_[(j + 1) % period];
+    const int c = candidate_at_[next_phase];
     if (c < 0) continue;
     // Position j + 1 starts candidate c's next window and ends its open one.
     const int64_t s = window_start_[c];
