@@ -1,4 +1,4 @@
-// Four floats as one value, for inner loops that the compiler should keep
+// Four (or eight) floats as one value, for inner loops that the compiler should keep
 // in SIMD registers: GCC and Clang map the arithmetic to SSE on x86 and
 // NEON on ARM, and to scalar code elsewhere. Loads and stores go through
 // memcpy, so pointers need no alignment.
@@ -43,6 +43,34 @@ inline float MaxLane4(Float4 v) {
   const float a = v[0] < v[1] ? v[1] : v[0];
   const float b = v[2] < v[3] ? v[3] : v[2];
   return a < b ? b : a;
+}
+
+// Eight floats as two Float4 halves, for loops over many independent lanes
+// (a plain 32-byte vector type lowers poorly without AVX: its comparisons
+// become scalar code).
+struct Float8 {
+  Float4 lo, hi;
+  float operator[](int lane) const { return lane < 4 ? lo[lane] : hi[lane - 4]; }
+};
+
+inline Float8 Load8(const float* p) { return {Load4(p), Load4(p + 4)}; }
+inline void Store8(float* p, Float8 v) {
+  Store4(p, v.lo);
+  Store4(p + 4, v.hi);
+}
+inline Float8 Splat8(float x) { return {Splat4(x), Splat4(x)}; }
+inline Float8 operator+(Float8 a, Float8 b) { return {a.lo + b.lo, a.hi + b.hi}; }
+inline Float8 operator-(Float8 a, Float8 b) { return {a.lo - b.lo, a.hi - b.hi}; }
+inline Float8 operator*(Float8 a, Float8 b) { return {a.lo * b.lo, a.hi * b.hi}; }
+inline Float8 operator/(Float8 a, Float8 b) { return {a.lo / b.lo, a.hi / b.hi}; }
+inline Float8& operator+=(Float8& a, Float8 b) { return a = a + b; }
+// Lane-wise std::max and std::min (same operand order, so the same result
+// for equal values).
+inline Float8 Max8(Float8 a, Float8 b) {
+  return {a.lo < b.lo ? b.lo : a.lo, a.hi < b.hi ? b.hi : a.hi};
+}
+inline Float8 Min8(Float8 a, Float8 b) {
+  return {b.lo < a.lo ? b.lo : a.lo, b.hi < a.hi ? b.hi : a.hi};
 }
 
 }  // namespace audio_dsp

@@ -1,7 +1,7 @@
 #include "audio/sorvane/token_selector.h"
 
 #include <algorithm>
-#include <functional>
+#include <bit>
 #include <tuple>
 
 #include "audio/dsp/batch_top_n.h"
@@ -31,6 +31,7 @@ TokenSelector::TokenSelector(const TokenSelectorParams& params) : params_(params
   scratch_.top = audio_dsp::BatchTopN<int>(params_.max_candidates_rank);
   // Scratch at its largest sizes, so selections never grow it.
   scratch_.runners_up.reserve(static_cast<size_t>(params_.alphabet_size) * symbol_period_);
+  scratch_.runner_up_keys.reserve(scratch_.runners_up.capacity());
   scratch_.choices.resize(symbol_period_);
   for (std::vector<int>& choices : scratch_.choices) choices.reserve(params_.alphabet_size);
   scratch_.spare_candidates.resize(params_.max_candidates_to_return);
@@ -95,13 +96,13 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
   }
 
   // Prune the weakest runners-up until few enough combinations remain. The
-  // best entry of each column always stays. (A min-heap on the value, then
-  // row and column.)
+  // best entry of each column always stays. Runners-up go in ascending
+  // (value, row, column) order: the order a min-heap would pop them in
+  // (entries are distinct), for the price of one sort.
   const int limit = params_.max_candidates_to_consider;
   s.counts.assign(period, 0);
   std::vector<Entry>& runners_up = s.runners_up;
   runners_up.clear();
-  const auto heap_order = std::greater<Entry>();
   for (int c = 0; c < period; ++c) {
     int best = 0;
     for (int r = 0; r < rows; ++r) {
@@ -111,10 +112,7 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
       const float v = (*scores_table)(r, c);
       if (v > 0.0f) {
         ++s.counts[c];
-        if (r != best) {
-          runners_up.emplace_back(v, r, c);
-          std::push_heap(runners_up.begin(), runners_up.end(), heap_order);
-        }
+        if (r != best) runners_up.emplace_back(v, r, c);
       }
     }
   }
@@ -123,12 +121,30 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
     for (int count : s.counts) product = std::min<int64_t>(product * count, limit + 1);
     return product;
   };
-  while (combinations() > limit && !runners_up.empty()) {
-    std::pop_heap(runners_up.begin(), runners_up.end(), heap_order);
-    const auto [value, r, c] = runners_up.back();
-    runners_up.pop_back();
-    (*scores_table)(r, c) = 0.0f;
-    --s.counts[c];
+  if (combinations() > limit && (rows > 0xffff || period > 0xffff)) {
+    std::sort(runners_up.begin(), runners_up.end());
+    for (const auto& [value, r, c] : runners_up) {
+      (*scores_table)(r, c) = 0.0f;
+      --s.counts[c];
+      if (combinations() <= limit) break;
+    }
+  } else if (combinations() > limit) {
+    // Values are positive floats, whose bit patterns order like the values:
+    // (value bits, row, column) packed into one integer sorts in the
+    // tuples' order.
+    std::vector<uint64_t>& keys = s.runner_up_keys;
+    keys.clear();
+    for (const auto& [value, r, c] : runners_up) {
+      keys.push_back(uint64_t{std::bit_cast<uint32_t>(value)} << 32 |
+                     static_cast<uint64_t>(r) << 16 | static_cast<uint64_t>(c));
+    }
+    std::sort(keys.begin(), keys.end());
+    for (const uint64_t key : keys) {
+      const int r = static_cast<int>(key >> 16 & 0xffff), c = static_cast<int>(key & 0xffff);
+      (*scores_table)(r, c) = 0.0f;
+      --s.counts[c];
+      if (combinations() <= limit) break;
+    }
   }
 
   // Enumerate the combinations as an odometer, column 0 fastest; the best

@@ -76,6 +76,7 @@ class TokenSelector {
     audio_dsp::FloatVector kept;
     std::vector<int> counts;
     std::vector<Entry> runners_up;
+    std::vector<uint64_t> runner_up_keys;
     std::vector<std::vector<int>> choices;
     std::vector<int> odometer;
     std::vector<int> sequence;

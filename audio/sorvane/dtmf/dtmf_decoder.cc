@@ -7,7 +7,6 @@
 
 #include "audio/dsp/float4.h"
 #include "audio/dsp/gamma_filter.h"
-#include "audio/dsp/max_filter.h"
 #include "audio/dsp/number_util.h"
 #include "audio/dsp/resampler.h"
 #include "audio/sorvane/compute_buffer_truncation.h"
@@ -15,6 +14,13 @@
 
 namespace audio_sorvane {
 namespace {
+
+using audio_dsp::Float8;
+using audio_dsp::Load8;
+using audio_dsp::Max8;
+using audio_dsp::Min8;
+using audio_dsp::Splat8;
+using audio_dsp::Store8;
 
 constexpr double kSpeedOfSound = 340.0;  // m/s
 
@@ -79,7 +85,7 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
       audio_dsp::GammaFilterPoleFromStddev(
           params_.noise_estimate_filter_stddev * baseband_frame_size_, order));
   column_scores_.resize(num_frequencies_);
-  top_.resize(params_.tones_per_symbol);
+  top8_.resize(params_.tones_per_symbol);
   folded_.resize(baseband_frame_size_);
 
   // The coherent path, when the token layout fits the search's limits. The
@@ -100,6 +106,8 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
     }
     const int period = baseband_frame_size_;
     const double phi = std::numbers::pi / period;
+    window_twiddles_.reserve(2 * period);
+    start_twiddles_.reserve(2 * period);
     for (int j = 0; j < 2 * period; ++j) {
       window_twiddles_.push_back(std::polar(1.0, phi * (j + 0.5)));
       start_twiddles_.push_back(std::polar(1.0, phi * j));
@@ -175,6 +183,92 @@ std::pair<std::span<const float>, std::span<const float>> ColumnRing::Pieces(
   return {std::span<const float>(base + at, n), std::span<const float>(base, count - n)};
 }
 
+void BlockMaxima::Init(const ColumnRing& values) {
+  CHECK(values.capacity() % kBlock == 0);
+  maxima_.Init(values.rows(), values.capacity() / kBlock);
+}
+
+void BlockMaxima::ComputeBlock(const ColumnRing& values, int64_t block) {
+  // Blocks never straddle the values ring's wrap (capacity % kBlock == 0).
+  for (int r = 0; r < values.rows(); ++r) {
+    const float* v = values.Pieces(r, block * kBlock, kBlock).first.data();
+    float m = v[0];
+    for (int i = 1; i < kBlock; ++i) m = std::max(m, v[i]);
+    maxima_.at(r, block) = m;
+  }
+}
+
+void BlockMaxima::Update(const ColumnRing& values, int64_t from, int64_t to) {
+  for (int64_t block = from / kBlock; (block + 1) * kBlock <= to; ++block) {
+    ComputeBlock(values, block);
+  }
+}
+
+void BlockMaxima::Rebuild(const ColumnRing& values, int64_t from, int64_t to) {
+  Init(values);
+  for (int64_t block = (from + kBlock - 1) / kBlock; (block + 1) * kBlock <= to; ++block) {
+    ComputeBlock(values, block);
+  }
+}
+
+namespace {
+
+// The largest of `count` values from `values` on, with a ring wrap after
+// `before_wrap` of them, folded into m.
+float RangeMax(const float* values, int before_wrap, const float* wrapped, int count, float m) {
+  for (int piece = 0; piece < 2 && count > 0; ++piece) {
+    const float* v = piece == 0 ? values : wrapped;
+    const int n = piece == 0 ? std::min(count, before_wrap) : count;
+    int j = 0;
+    if (n >= 4) {
+      audio_dsp::Float4 a = audio_dsp::Load4(v);
+      for (j = 4; j + 4 <= n; j += 4) a = audio_dsp::Max4(a, audio_dsp::Load4(v + j));
+      m = std::max(m, audio_dsp::MaxLane4(a));
+    }
+    for (; j < n; ++j) m = std::max(m, v[j]);
+    count -= n;
+  }
+  return m;
+}
+
+}  // namespace
+
+// [first, last] = head values, whole blocks, tail values; the ring offsets
+// are the same for every row.
+void BlockMaxima::Max(const ColumnRing& values, int64_t first, int64_t last,
+                      float* maxima) const {
+  const int capacity = values.capacity();
+  const int block_capacity = maxima_.capacity();
+  const int64_t first_block = (first + kBlock - 1) / kBlock;
+  const int64_t end_block = (last + 1) / kBlock;  // past the last whole block
+  const bool has_blocks = first_block < end_block;
+  const int head = has_blocks ? static_cast<int>(first_block * kBlock - first)
+                              : static_cast<int>(last - first + 1);
+  const int blocks = has_blocks ? static_cast<int>(end_block - first_block) : 0;
+  const int64_t tail_first = has_blocks ? end_block * kBlock : last + 1;
+  const int tail = static_cast<int>(last + 1 - tail_first);
+  const int head_at = static_cast<int>(first % capacity);
+  const int tail_at = static_cast<int>(tail_first % capacity);
+  const int block_at = static_cast<int>(first_block % block_capacity);
+  for (int r = 0; r < values.rows(); ++r) {
+    const float* row = values.row(r);
+    const float* block_row = maxima_.row(r);
+    float m = RangeMax(block_row + block_at, block_capacity - block_at, block_row, blocks,
+                       -INFINITY);
+    m = RangeMax(row + head_at, capacity - head_at, row, head, m);
+    maxima[r] = RangeMax(row + tail_at, capacity - tail_at, row, tail, m);
+  }
+}
+
+void BlockMaxima::MaxReference(const ColumnRing& values, int64_t first, int64_t last,
+                               float* maxima) {
+  for (int r = 0; r < values.rows(); ++r) {
+    float m = -INFINITY;
+    for (int64_t p = first; p <= last; ++p) m = std::max(m, values.at(r, p));
+    maxima[r] = m;
+  }
+}
+
 void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   CHECK(received_sample_rate > 0.0);
   CHECK(num_channels >= 1);
@@ -198,11 +292,19 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   tone_bank_->Reset();
   // The buffers hold at most the budget's worth of baseband samples (see
   // ProcessSamples); a little more covers the resampler's rounding.
-  const int capacity =
-      static_cast<int>(std::ceil(max_buffer_size_ / received_per_baseband_)) + 64;
+  const int capacity = audio_dsp::RoundUpToMultiple(
+      static_cast<int>(std::ceil(max_buffer_size_ / received_per_baseband_)) + 64,
+      BlockMaxima::kBlock);
   strengths_.Init(num_frequencies_, capacity);
+  strength_blocks_.Init(strengths_);
   columns_.Init(2, capacity);
-  acquisition_.reserve(capacity);
+  acquisition_.reserve(std::max<size_t>(smoother_->PaddedLength(capacity), ColumnScratchSize()));
+  for (SlotCache* cache : {&slot_cache_, &next_slot_cache_}) {
+    cache->positions.clear();
+    cache->scores.clear();
+    cache->positions.reserve(capacity / baseband_frame_size_ + 2);
+    cache->scores.reserve(cache->positions.capacity() * num_frequencies_);
+  }
   last_search_end_ = -1;
   columns_begin_ = 0;
   columns_length_ = 0;
@@ -291,13 +393,16 @@ void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
       mono, bank_strength_rows_.data(), search_supported_ ? bank_sum_rows_.data() : nullptr);
   const int64_t end = begin_ + tone_strength_buffer_size_;
   if (tone_strength_buffer_size_ + added > strengths_.capacity()) {
-    const int capacity = 2 * (tone_strength_buffer_size_ + added);
+    const int capacity = audio_dsp::RoundUpToMultiple(2 * (tone_strength_buffer_size_ + added),
+                                                      BlockMaxima::kBlock);
     strengths_.Reserve(capacity, begin_, end);
+    strength_blocks_.Rebuild(strengths_, begin_, end);
     columns_.Reserve(capacity, columns_begin_, columns_begin_ + columns_length_);
   }
   for (int i = 0; i < num_frequencies_; ++i) {
     strengths_.Write(i, end, bank_strength_rows_[i], added);
   }
+  strength_blocks_.Update(strengths_, end, end + added);
   if (search_supported_) TrackFrames(added);
   tone_strength_buffer_size_ += added;
 }
@@ -308,15 +413,26 @@ void DtmfDecoder::TrackFrames(int count) {
   const int period = baseband_frame_size_;
   const int tones = num_frequencies_;
   const int max_frames = params_.room_search.max_frames;
-  for (int n = 0; n < count; ++n) {
+  // j mod 2P and (j + 1) mod P, advanced with j.
+  int twiddle = static_cast<int>(block_position_ % (2 * period));
+  int next_phase = static_cast<int>((block_position_ + 1) % period);
+  for (int n = 0; n < count; ++n, twiddle = twiddle + 1 == 2 * period ? 0 : twiddle + 1,
+           next_phase = next_phase + 1 == period ? 0 : next_phase + 1) {
     const int64_t j = block_position_++;
-    const std::complex<double> w = window_twiddles_[j % (2 * period)];
+    // running_a += w z and running_b += conj(w) z, written out: the
+    // operators' NaN handling keeps them from vectorising.
+    const double w_re = window_twiddles_[twiddle].real();
+    const double w_im = window_twiddles_[twiddle].imag();
+    double* a_sums = reinterpret_cast<double*>(running_a_.data());
+    double* b_sums = reinterpret_cast<double*>(running_b_.data());
     for (int k = 0; k < tones; ++k) {
-      const std::complex<double> z(bank_sum_rows_[k][n]);
-      running_a_[k] += w * z;
-      running_b_[k] += std::conj(w) * z;
+      const double z_re = bank_sum_rows_[k][n].real(), z_im = bank_sum_rows_[k][n].imag();
+      a_sums[2 * k] += w_re * z_re - w_im * z_im;
+      a_sums[2 * k + 1] += w_re * z_im + w_im * z_re;
+      b_sums[2 * k] += w_re * z_re + w_im * z_im;
+      b_sums[2 * k + 1] += w_re * z_im - w_im * z_re;
     }
-    const int c = candidate_at_[(j + 1) % period];
+    const int c = candidate_at_[next_phase];
     if (c < 0) continue;
     // Position j + 1 starts candidate c's next window and ends its open one.
     const int64_t s = window_start_[c];
@@ -329,9 +445,9 @@ void DtmfDecoder::TrackFrames(int count) {
           &frame_values_[(static_cast<size_t>(c) * max_frames + slot) * tones];
       for (int k = 0; k < tones; ++k) {
         const std::complex<double> sum =
-            (std::conj(turn) * (running_a_[k] - a[k]) - turn * (running_b_[k] - b[k])) /
-            std::complex<double>(0.0, 2.0);
-        out[k] = std::complex<float>(sum);
+            std::conj(turn) * (running_a_[k] - a[k]) - turn * (running_b_[k] - b[k]);
+        // sum / 2i
+        out[k] = std::complex<float>(std::complex<double>(sum.imag() * 0.5, -sum.real() * 0.5));
       }
       frame_starts_[static_cast<size_t>(c) * max_frames + slot] = s;
       frame_next_[c] = (slot + 1) % max_frames;
@@ -381,106 +497,150 @@ void DtmfDecoder::UpdateColumnScores() {
 // Columns [first, last) of the acquisition's signal (the weakest of the
 // tones_per_symbol strongest normalised tones) and unsmoothed noise (the
 // mean of the other tones), in chunks so that the scratch stays small.
+size_t DtmfDecoder::ColumnScratchSize() const {
+  // ComputeColumns' rows of raw values and levels (half a window of
+  // columns, padded by 8), its van Herk values, and a chunk's signal and
+  // noise.
+  const int window = std::max(
+      static_cast<int>(params_.tone_normalization_params.window_size * baseband_frame_size_), 1);
+  const int chunk = (window + 1) / 2;
+  return 2 * static_cast<size_t>(chunk + 8) * num_frequencies_ + 2 * static_cast<size_t>(window) +
+         2 * static_cast<size_t>(chunk);
+}
+
 void DtmfDecoder::ComputeColumns(int first, int last) {
   if (first >= last) return;
   const ToneNormalizationParams& norm = params_.tone_normalization_params;
   const int length = tone_strength_buffer_size_;
-  const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
-  const int ahead = std::max(window - 1, 0) / 2;
+  const int window_size = static_cast<int>(norm.window_size * baseband_frame_size_);
+  CHECK(window_size >= 1);  // as the running-maximum filter checks it
+  const int window = window_size;
+  const int ahead = (window - 1) / 2;
+  const int back = window - 1 - ahead;
   const int rows = num_frequencies_;
-  constexpr int kChunk = 1024;
-  const int span_max = kChunk + window;
-  if (chunk_raw_.size() < static_cast<size_t>(span_max) * rows) {
-    chunk_raw_.resize(static_cast<size_t>(span_max) * rows);
-    chunk_local_.resize(span_max);
-    max_scratch_.resize(2 * static_cast<size_t>(span_max));
-    chunk_levels_.resize(static_cast<size_t>(kChunk) * rows);
-    strongest_.resize(kChunk);
-    chunk_signal_.resize(kChunk);
-    chunk_noise_.resize(kChunk);
-  }
+  // Half a window's worth of columns per chunk (the scratch then fits in
+  // the smoother's share of the buffer); rows padded by 8 floats so a group
+  // of eight columns can always be loaded whole.
+  const int chunk = (window + 1) / 2;
+  const int stride = chunk + 8;
+  // Scratch in the acquisition buffer, whose values are computed only
+  // after the columns (one buffer instead of two).
+  if (acquisition_.size() < ColumnScratchSize()) acquisition_.resize(ColumnScratchSize());
+  float* const chunk_raw = acquisition_.data();
+  float* const chunk_levels = chunk_raw + static_cast<size_t>(stride) * rows;
+  float* const max_scratch = chunk_levels + static_cast<size_t>(stride) * rows;
+  float* const chunk_signal = max_scratch + 2 * static_cast<size_t>(window);
+  float* const chunk_noise = chunk_signal + chunk;
   const int k = num_frequencies_ - params_.tones_per_symbol;
   const int top_count = params_.tones_per_symbol;
-  float* top = top_.data();
-  for (int c0 = first; c0 < last; c0 += kChunk) {
-    const int c1 = std::min(last, c0 + kChunk);
+  Float8* top = top8_.data();
+  for (int c0 = first; c0 < last; c0 += chunk) {
+    const int c1 = std::min(last, c0 + chunk);
     const int count = c1 - c0;
-    // The raw strengths every window of these columns can reach.
-    const int from = std::max(0, c0 + ahead - window + 1);
-    const int to = std::min(length, c1 + ahead);
-    const int span = to - from;
-    const int offset = c0 - from;
-    // Local level of every tone (running maximum), and the strongest.
+    const int offset = 0;
+    // Local levels (running maxima over the windows clipped to the buffer)
+    // by blocks of one window (van Herk / Gil-Werman): the windows of these
+    // columns start in block A = [a, a + window) and end in A or in the
+    // next block B, so each is max(suffix of A from its start, prefix of B
+    // to its end). Positions outside the buffer count as -inf, which clips
+    // the windows. Max is exact, so the levels equal a direct scan's.
+    const int a = c0 - back;
+    const int span = window + count - 1;  // A, then B up to the last end
+    const int valid_from = std::clamp(-a, 0, span);
+    const int valid_to = std::clamp(length - a, valid_from, span);
+    float* values = max_scratch;
     for (int i = 0; i < rows; ++i) {
-      float* raw = chunk_raw_.data() + static_cast<size_t>(i) * span_max;
-      strengths_.Read(i, begin_ + from, span, raw);
-      audio_dsp::MaxFilter(raw, span, window, chunk_local_.data(), max_scratch_.data());
-      std::copy_n(chunk_local_.data() + offset, count, chunk_levels_.data() + i * kChunk);
+      std::fill(values, values + valid_from, -INFINITY);
+      strengths_.Read(i, begin_ + a + valid_from, valid_to - valid_from, values + valid_from);
+      std::fill(values + valid_to, values + span, -INFINITY);
+      float* raw = chunk_raw + static_cast<size_t>(i) * stride;
+      std::copy_n(values + back, count, raw);
+      // A's suffix and B's prefix maxima, side by side (two independent
+      // chains).
+      float suffix = -INFINITY, prefix = -INFINITY;
+      const int both = std::min(window, span - window);
+      for (int p = 0; p < both; ++p) {
+        values[window - 1 - p] = suffix = std::max(suffix, values[window - 1 - p]);
+        values[window + p] = prefix = std::max(prefix, values[window + p]);
+      }
+      for (int p = window - 1 - both; p >= 0; --p) values[p] = suffix = std::max(suffix, values[p]);
+      for (int p = window + both; p < span; ++p) values[p] = prefix = std::max(prefix, values[p]);
+      float* levels = chunk_levels + static_cast<size_t>(i) * stride;
+      levels[0] = values[0];
+      for (int t = 1; t < count; ++t) levels[t] = std::max(values[t], values[window + t - 1]);
     }
-    std::copy_n(chunk_levels_.data(), count, strongest_.data());
-    for (int i = 1; i < rows; ++i) {
-      const float* levels = chunk_levels_.data() + i * kChunk;
-      for (int t = 0; t < count; ++t) strongest_[t] = std::max(strongest_[t], levels[t]);
-    }
-    // With few tones per symbol, keeping the strongest ones in a small
-    // sorted array is cheaper than a partial sort of every column.
-    for (int t = 0; t < count; ++t) {
-      std::fill(top, top + top_count, -INFINITY);  // descending
-      float sum = 0.0f;
+    // Per column: the strongest local level, the normalised tones, their
+    // sum and the tones_per_symbol largest (kept sorted by a max / min
+    // exchange, which yields the same values as an insertion). Eight
+    // columns at a time in the lanes of a Float8; a column's arithmetic is
+    // the same, in the same order, as done one column at a time.
+    const Float8 weight = Splat8(norm.cross_frequency_weight);
+    const Float8 floor = Splat8(norm.division_floor);
+    const auto column_group = [&](int t, Float8* signal, Float8* noise) {
+      Float8 strongest = Load8(chunk_levels + t);
+      for (int i = 1; i < rows; ++i) {
+        strongest = Max8(strongest, Load8(chunk_levels + i * stride + t));
+      }
+      for (int j = 0; j < top_count; ++j) top[j] = Splat8(-INFINITY);  // descending
+      Float8 sum = Splat8(0.0f);
       for (int i = 0; i < rows; ++i) {
-        const float level = chunk_levels_[i * kChunk + t];
-        const float v =
-            chunk_raw_[static_cast<size_t>(i) * span_max + offset + t] /
-            (level + norm.cross_frequency_weight * (strongest_[t] - level) + norm.division_floor);
+        const Float8 level = Load8(chunk_levels + i * stride + t);
+        Float8 v = Load8(chunk_raw + static_cast<size_t>(i) * stride + offset + t) /
+                   (level + weight * (strongest - level) + floor);
         sum += v;
-        if (v > top[top_count - 1]) {
-          int j = top_count - 1;
-          for (; j > 0 && top[j - 1] < v; --j) top[j] = top[j - 1];
-          top[j] = v;
+        for (int j = 0; j < top_count; ++j) {
+          const Float8 high = Max8(top[j], v);
+          v = Min8(top[j], v);
+          top[j] = high;
         }
       }
-      float top_sum = 0.0f;
+      Float8 top_sum = Splat8(0.0f);
       for (int j = 0; j < top_count; ++j) top_sum += top[j];
-      chunk_signal_[t] = top[top_count - 1];  // the k-th smallest value
-      chunk_noise_[t] = k > 0 ? (sum - top_sum) / static_cast<float>(k) : 0.0f;
+      *signal = top[top_count - 1];  // the k-th smallest value
+      *noise = k > 0 ? (sum - top_sum) / Splat8(static_cast<float>(k)) : Splat8(0.0f);
+    };
+    int t = 0;
+    for (; t + 8 <= count; t += 8) {
+      Float8 signal, noise;
+      column_group(t, &signal, &noise);
+      Store8(chunk_signal + t, signal);
+      Store8(chunk_noise + t, noise);
     }
-    columns_.Write(0, begin_ + c0, chunk_signal_.data(), count);
-    columns_.Write(1, begin_ + c0, chunk_noise_.data(), count);
+    if (t < count) {
+      // The last few columns through a padded group (the lanes past
+      // `count` read scratch values and are not kept).
+      Float8 signal, noise;
+      column_group(t, &signal, &noise);
+      for (int l = 0; t + l < count; ++l) {
+        chunk_signal[t + l] = signal[l];
+        chunk_noise[t + l] = noise[l];
+      }
+    }
+    columns_.Write(0, begin_ + c0, chunk_signal, count);
+    columns_.Write(1, begin_ + c0, chunk_noise, count);
   }
 }
 
-// The normalised scores of every tone at buffer column t: the local levels
-// are the maxima over the column's clipped window, read directly.
-void DtmfDecoder::ToneScoresAt(int t) {
+// The normalised scores of every tone at buffer column t; the local levels
+// are the maxima over the column's clipped window.
+void DtmfDecoder::ToneScoresAt(int t, float* scores) const {
   const ToneNormalizationParams& norm = params_.tone_normalization_params;
   const int length = tone_strength_buffer_size_;
   const int window = static_cast<int>(norm.window_size * baseband_frame_size_);
   const int ahead = std::max(window - 1, 0) / 2;
   const int lo = std::max(0, t + ahead - window + 1);
   const int hi = std::min(length - 1, t + ahead);
-  float strongest = -INFINITY;
-  for (int i = 0; i < num_frequencies_; ++i) {
-    const auto [a, b] = strengths_.Pieces(i, begin_ + lo, hi - lo + 1);
-    float level = -INFINITY;
-    for (const std::span<const float> piece : {a, b}) {
-      size_t j = 0;
-      if (piece.size() >= 4) {
-        audio_dsp::Float4 m = audio_dsp::Load4(piece.data());
-        for (j = 4; j + 4 <= piece.size(); j += 4) {
-          m = audio_dsp::Max4(m, audio_dsp::Load4(piece.data() + j));
-        }
-        level = std::max(level, audio_dsp::MaxLane4(m));
-      }
-      for (; j < piece.size(); ++j) level = std::max(level, piece[j]);
-    }
-    column_scores_[i] = level;
-    strongest = std::max(strongest, level);
+  if (params_.use_reference_paths) {
+    BlockMaxima::MaxReference(strengths_, begin_ + lo, begin_ + hi, scores);
+  } else {
+    strength_blocks_.Max(strengths_, begin_ + lo, begin_ + hi, scores);
   }
+  float strongest = -INFINITY;
+  for (int i = 0; i < num_frequencies_; ++i) strongest = std::max(strongest, scores[i]);
   for (int i = 0; i < num_frequencies_; ++i) {
-    const float level = column_scores_[i];
-    column_scores_[i] = strengths_.at(i, begin_ + t) /
-                        (level + norm.cross_frequency_weight * (strongest - level) +
-                         norm.division_floor);
+    const float level = scores[i];
+    scores[i] = strengths_.at(i, begin_ + t) /
+                (level + norm.cross_frequency_weight * (strongest - level) + norm.division_floor);
   }
 }
 
@@ -503,13 +663,17 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
 
   UpdateColumnScores();
   // Smoothed noise, then the acquisition scores in place.
-  acquisition_.resize(length);
+  // acquisition_ has room for the smoother's padding (reserved at Init).
+  acquisition_.resize(smoother_->PaddedLength(length));
   const auto [noise_a, noise_b] = columns_.Pieces(1, begin_, length);
   if (params_.use_reference_paths) {
     smoother_->SmoothReference(noise_a, noise_b, acquisition_.data());
   } else {
-    smoother_->Smooth(noise_a, noise_b, acquisition_.data());
+    std::copy(noise_a.begin(), noise_a.end(), acquisition_.begin());
+    std::copy(noise_b.begin(), noise_b.end(), acquisition_.begin() + noise_a.size());
+    smoother_->SmoothInPlace(acquisition_.data(), length);
   }
+  acquisition_.resize(length);
   {
     const auto [signal_a, signal_b] = columns_.Pieces(0, begin_, length);
     float* acquisition = acquisition_.data();
@@ -525,7 +689,10 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   // Symbol timing: the phase of the acquisition folded over whole periods.
   const int period = baseband_frame_size_;
   std::fill(folded_.begin(), folded_.end(), 0.0);
-  for (int p = 0; p < (length / period) * period; ++p) folded_[p % period] += acquisition_scores[p];
+  for (int k = 0; k < length / period; ++k) {
+    const float* scores = acquisition_scores.data() + static_cast<size_t>(k) * period;
+    for (int p = 0; p < period; ++p) folded_[p] += scores[p];
+  }
   const std::complex<double> step = std::polar(1.0, 2.0 * std::numbers::pi / period);
   std::complex<double> phasor(1.0, 0.0), sum;
   for (int p = 0; p < period; ++p) {
@@ -540,6 +707,12 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   CHECK(acquisition_scores.size() == static_cast<size_t>(tone_strength_buffer_size_));
   const int alphabet = static_cast<int>(params_.symbol_table.size());
   const float discarded_seconds = static_cast<float>(begin_) / baseband_sample_rate_;
+  const int window = static_cast<int>(params_.tone_normalization_params.window_size * period);
+  const int ahead = std::max(window - 1, 0) / 2;
+  const size_t tones = static_cast<size_t>(num_frequencies_);
+  size_t cached = 0;
+  next_slot_cache_.positions.clear();
+  next_slot_cache_.scores.clear();
   for (int slot = 0, t = t0; t < length; ++slot, t += period) {
     float score = acquisition_scores[t];
     if (t > period && t + period < length) {
@@ -547,7 +720,24 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
                                        acquisition_scores[t + period]));
     }
     if (score < params_.acquisition_threshold) continue;
-    ToneScoresAt(t);
+    // Scores of a slot whose window lies inside the buffer come from the
+    // last request when it computed them; the values are the same.
+    const int64_t position = begin_ + t;
+    const bool inside = t + ahead - window + 1 >= 0 && t + ahead <= length - 1;
+    while (cached < slot_cache_.positions.size() && slot_cache_.positions[cached] < position) {
+      ++cached;
+    }
+    if (inside && !params_.use_reference_paths && cached < slot_cache_.positions.size() &&
+        slot_cache_.positions[cached] == position) {
+      std::copy_n(slot_cache_.scores.data() + cached * tones, tones, column_scores_.data());
+    } else {
+      ToneScoresAt(t, column_scores_.data());
+    }
+    if (inside) {
+      next_slot_cache_.positions.push_back(position);
+      next_slot_cache_.scores.insert(next_slot_cache_.scores.end(), column_scores_.begin(),
+                                     column_scores_.end());
+    }
     slot_scores_.resize(alphabet);
     for (int s = 0; s < alphabet; ++s) {
       float weakest = INFINITY;
@@ -562,6 +752,7 @@ bool DtmfDecoder::GetToken(DecodeResults* decode_results) {
   // The selector fills the candidate list in place; those of the right
   // length are kept, in order.
   std::vector<DecodedToken>& candidates = decode_results->tokens;
+  std::swap(slot_cache_, next_slot_cache_);
   token_selector_->SelectTokens(decode_results->symbol_scores, &decode_results->scores_table,
                                 &candidates);
   size_t kept = 0;

@@ -24,6 +24,7 @@
 #include <vector>
 
 #include "audio/dsp/eigen_types.h"
+#include "audio/dsp/float4.h"
 #include "audio/dsp/rational_factor_resampler.h"
 #include "audio/sorvane/dtmf/byte_symbol_converter.h"
 #include "audio/sorvane/dtmf/dtmf_encoder_params.h"
@@ -97,9 +98,10 @@ struct DtmfDecoderParams : DtmfEncoderParams {
   int max_candidates_per_decode_token_call = 2;
   float token_threshold_factor = 1.0f / 3.0f;
   RoomSearchParams room_search;
-  // Runs the tone filters and the noise smoother in their direct reference
-  // forms (ToneStrengthFilter::ProcessSamplesReference,
-  // AlignedGammaSmoother::SmoothReference) instead of the fast ones; for
+  // Runs the tone filters, the noise smoother and the slots' local levels
+  // in their direct reference forms (ToneStrengthFilter::
+  // ProcessSamplesReference, AlignedGammaSmoother::SmoothReference,
+  // BlockMaxima::MaxReference, no slot cache) instead of the fast ones; for
   // tests.
   bool use_reference_paths = false;
 };
@@ -112,7 +114,10 @@ class ColumnRing {
   void Init(int rows, int capacity);
   // Makes room for `capacity` positions, keeping [from, to).
   void Reserve(int capacity, int64_t from, int64_t to);
+  int rows() const { return rows_; }
   int capacity() const { return capacity_; }
+  // Row r in ring order (position p at p mod capacity).
+  const float* row(int r) const { return data_.data() + static_cast<size_t>(r) * capacity_; }
   float& at(int row, int64_t position) {
     return data_[static_cast<size_t>(row) * capacity_ + static_cast<size_t>(position % capacity_)];
   }
@@ -129,6 +134,36 @@ class ColumnRing {
   int rows_ = 0;
   int capacity_ = 0;
   std::vector<float> data_;
+};
+
+// The maxima of aligned blocks of kBlock stream positions of a ColumnRing
+// (block b covers [b * kBlock, (b + 1) * kBlock)), kept in a ring of the
+// same wrap, so that the maximum over a long range reads a few values per
+// block instead of every value. Max is exact: it equals MaxReference, the
+// direct scan, for any range of positions the ring holds.
+//
+// Not thread safe. The values ring's capacity must be a multiple of kBlock
+// (CHECK).
+class BlockMaxima {
+ public:
+  static constexpr int kBlock = 64;
+
+  void Init(const ColumnRing& values);
+  // Computes the blocks that end in (from, to]: call after writing values
+  // [from, to), with the block holding `from` written from its start.
+  void Update(const ColumnRing& values, int64_t from, int64_t to);
+  // Recomputes every block inside [from, to) (after the values ring grew).
+  void Rebuild(const ColumnRing& values, int64_t from, int64_t to);
+  // The largest value of every row over positions [first, last] (first <=
+  // last), one per row into `maxima`.
+  void Max(const ColumnRing& values, int64_t first, int64_t last, float* maxima) const;
+  static void MaxReference(const ColumnRing& values, int64_t first, int64_t last,
+                           float* maxima);
+
+ private:
+  void ComputeBlock(const ColumnRing& values, int64_t block);
+
+  ColumnRing maxima_;  // one value per block
 };
 
 class DtmfDecoder {
@@ -168,8 +203,11 @@ class DtmfDecoder {
   // computing only the columns that changed (see the .cc).
   void UpdateColumnScores();
   void ComputeColumns(int first, int last);
-  // The normalised tone scores of buffer column t, into column_scores_.
-  void ToneScoresAt(int t);
+  size_t ColumnScratchSize() const;
+  // The normalised tone scores of buffer column t, into `scores`: local
+  // levels from the block maxima (BlockMaxima::MaxReference, the direct
+  // scan, on the reference paths). Equal results.
+  void ToneScoresAt(int t, float* scores) const;
   // Running windowed sums of the block sums for the coherent path: the
   // matched-filter output of every frame of every timing candidate, as it
   // completes.
@@ -204,6 +242,7 @@ class DtmfDecoder {
   // Raw tone strengths, one row per tone, for stream positions
   // [begin_, begin_ + tone_strength_buffer_size_).
   ColumnRing strengths_;
+  BlockMaxima strength_blocks_;
   int64_t begin_ = 0;
   int tone_strength_buffer_size_ = 0;
   bool initialized_ = false;
@@ -247,10 +286,17 @@ class DtmfDecoder {
   int columns_length_ = 0;
   std::unique_ptr<AlignedGammaSmoother> smoother_;
   // Scratch, sized once.
-  std::vector<float> chunk_raw_, chunk_local_, chunk_levels_, max_scratch_, strongest_;
-  std::vector<float> chunk_signal_, chunk_noise_;
-  std::vector<float> column_scores_, top_, acquisition_;
+  std::vector<audio_dsp::Float8> top8_;  // the strongest tones of eight columns
+  std::vector<float> column_scores_, acquisition_;
   audio_dsp::FloatVector slot_scores_;    // one slot's symbol scores
+  // Tone scores of the slots of the last GetToken whose windows lay inside
+  // the buffer, by stream position (ascending), and those of the current
+  // one: a slot whose window still lies inside has the same scores.
+  struct SlotCache {
+    std::vector<int64_t> positions;
+    std::vector<float> scores;  // num_frequencies_ per position
+  };
+  SlotCache slot_cache_, next_slot_cache_;
   std::vector<DecodedToken> rejected_;    // candidates of the wrong length
   mutable std::vector<double> repeat_scratch_;  // LoopRepeats' strengths
   std::vector<double> folded_;

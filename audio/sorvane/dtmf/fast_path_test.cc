@@ -123,6 +123,11 @@ TEST(AlignedGammaSmootherTest, FastPathMatchesReference) {
       smoother.Smooth(std::span<const float>(x.data(), cut),
                       std::span<const float>(x.data() + cut, length - cut), split.data());
       EXPECT_EQ(fast, split) << order << " " << length;
+      std::vector<float> in_place(smoother.PaddedLength(length));
+      std::copy(x.begin(), x.end(), in_place.begin());
+      smoother.SmoothInPlace(in_place.data(), length);
+      in_place.resize(length);
+      EXPECT_EQ(fast, in_place) << order << " " << length;
       for (int i = 0; i < length; ++i) {
         ASSERT_NEAR(fast[i], reference[i], 1e-5f * peak) << order << " " << length << " " << i;
       }
@@ -137,6 +142,44 @@ TEST(MaxFilterTest, ScratchFormEqualsAllocatingForm) {
     audio_dsp::MaxFilter(x.data(), static_cast<int>(x.size()), window, a.data());
     audio_dsp::MaxFilter(x.data(), static_cast<int>(x.size()), window, b.data(), scratch.data());
     EXPECT_EQ(a, b) << window;
+  }
+}
+
+// Block maxima give exactly the direct scan's maxima for ranges of every
+// length and alignment, across the ring's wrap, while values are appended in
+// random pieces and dropped from the front, and after the ring grows.
+TEST(BlockMaximaTest, MaxEqualsDirectScanOnRandomAppendsAndDrops) {
+  std::mt19937 rng(17);
+  std::normal_distribution<float> value(0.0f, 1.0f);
+  std::uniform_int_distribution<int> piece(1, 40);
+  ColumnRing ring;
+  ring.Init(3, 10 * BlockMaxima::kBlock);
+  BlockMaxima blocks;
+  blocks.Init(ring);
+  int64_t begin = 0, end = 0;
+  std::vector<float> row(40), fast(3), reference(3);
+  for (int round = 0; round < 400; ++round) {
+    if (round == 200) {  // grow, keeping what is buffered
+      ring.Reserve(17 * BlockMaxima::kBlock, begin, end);
+      blocks.Rebuild(ring, begin, end);
+    }
+    const int added = piece(rng);
+    begin = std::max(begin, end + added - ring.capacity());
+    for (int r = 0; r < 3; ++r) {
+      for (int i = 0; i < added; ++i) row[i] = value(rng);
+      ring.Write(r, end, row.data(), added);
+    }
+    blocks.Update(ring, end, end + added);
+    end += added;
+    begin += std::uniform_int_distribution<int64_t>(0, (end - begin) / 4)(rng);
+    for (int q = 0; q < 20; ++q) {
+      std::uniform_int_distribution<int64_t> at(begin, end - 1);
+      int64_t first = at(rng), last = at(rng);
+      if (first > last) std::swap(first, last);
+      blocks.Max(ring, first, last, fast.data());
+      BlockMaxima::MaxReference(ring, first, last, reference.data());
+      ASSERT_EQ(fast, reference) << first << ".." << last;
+    }
   }
 }
 

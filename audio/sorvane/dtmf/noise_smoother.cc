@@ -74,21 +74,40 @@ void AlignedGammaSmoother::EnsureTables(int length) {
   }
 }
 
+int AlignedGammaSmoother::PaddedLength(int length) const {
+  const int total = length + delay_;
+  return std::max(kLanes * ((total + kLanes - 1) / kLanes), length);
+}
+
 void AlignedGammaSmoother::Smooth(std::span<const float> first, std::span<const float> second,
                                   float* output) {
-  const int n1 = static_cast<int>(first.size());
   const int length = static_cast<int>(first.size() + second.size());
   if (length == 0) return;
-  const int d = delay_;
   if (order_ > kMaxOrder) return SmoothReference(first, second, output);
+  input_.resize(std::max<size_t>(input_.size(), PaddedLength(length)));
+  std::copy(first.begin(), first.end(), input_.begin());
+  std::copy(second.begin(), second.end(), input_.begin() + first.size());
+  SmoothInPlace(input_.data(), length);
+  std::copy_n(input_.data(), length, output);
+}
+
+void AlignedGammaSmoother::SmoothInPlace(float* data, int length) {
+  if (length == 0) return;
+  const int d = delay_;
+  if (order_ > kMaxOrder) {
+    input_.assign(data, data + length);
+    return SmoothReference(std::span<const float>(input_), {}, data);
+  }
+  const std::span<const float> first(data, length), second;
   if (length <= d) {
-    std::fill(output, output + length, Mean(first, second, 0, length));
+    std::fill(data, data + length, Mean(first, second, 0, length));
     return;
   }
-  const float head = d > 0 ? Mean(first, second, 0, d) : (n1 > 0 ? first[0] : second[0]);
-  const float tail = d > 0 ? Mean(first, second, length - d, length)
-                           : (length > n1 ? second[length - n1 - 1] : first[length - 1]);
+  const float head = d > 0 ? Mean(first, second, 0, d) : data[0];
+  const float tail = d > 0 ? Mean(first, second, length - d, length) : data[length - 1];
   // The input u = x ++ (d times tail); y[j] (j >= d) goes to output[j - d].
+  // Each lane reads u at an index before writing y there, so y replaces u
+  // in place.
   const int total = length + d;
   const int segment = (total + kLanes - 1) / kLanes;
   EnsureTables(segment);
@@ -102,19 +121,13 @@ void AlignedGammaSmoother::Smooth(std::span<const float> first, std::span<const 
     state[k][1] = Splat4(0.0f);
   }
   float final_state[kLanes][kMaxOrder] = {};
-  // The padded input and the full output (y[j] at j), contiguous.
   const int padded = kLanes * segment;
-  if (input_.size() < static_cast<size_t>(padded)) {
-    input_.resize(padded);
-    full_.resize(padded);
-  }
-  std::copy(first.begin(), first.end(), input_.begin());
-  std::copy(second.begin(), second.end(), input_.begin() + n1);
-  std::fill(input_.begin() + length, input_.begin() + padded, tail);
+  float* const full = data;
+  std::fill(data + length, data + padded, tail);
   int lane_length[kLanes];
   for (int q = 0; q < kLanes; ++q) lane_length[q] = std::clamp(total - q * segment, 0, segment);
   for (int i = 0; i < segment; ++i) {
-    const float* x = input_.data() + i;
+    float* x = data + i;
     Float4 in[2] = {Float4{x[0], x[segment], x[2 * segment], x[3 * segment]},
                     Float4{x[4 * segment], x[5 * segment], x[6 * segment], x[7 * segment]}};
     for (int k = 0; k < order; ++k) {
@@ -123,11 +136,13 @@ void AlignedGammaSmoother::Smooth(std::span<const float> first, std::span<const 
         in[h] = state[k][h];
       }
     }
-    for (int q = 0; q < kLanes; ++q) full_[q * segment + i] = in[q / 4][q % 4];
-    for (int q = 0; q < kLanes; ++q) {
-      if (i == lane_length[q] - 1) {
-        for (int k = 0; k < order; ++k) final_state[q][k] = state[k][q / 4][q % 4];
-      }
+    for (int q = 0; q < kLanes; ++q) full[q * segment + i] = in[q / 4][q % 4];
+  }
+  // The end states of the whole segments (only those are read below; a
+  // short last segment ran on into the padding).
+  for (int q = 0; q < kLanes; ++q) {
+    if (lane_length[q] == segment) {
+      for (int k = 0; k < order; ++k) final_state[q][k] = state[k][q / 4][q % 4];
     }
   }
 
@@ -156,7 +171,7 @@ void AlignedGammaSmoother::Smooth(std::span<const float> first, std::span<const 
       const int n = j - start + 1;
       float free = 0.0f;
       for (int m = 0; m < order; ++m) free += c[m * t + n - 1] * entry[order - 1 - m];
-      full_[j] += free;
+      full[j] += free;
     }
     for (; j + 4 <= end; j += 4) {
       const int n = j - start + 1;
@@ -164,16 +179,16 @@ void AlignedGammaSmoother::Smooth(std::span<const float> first, std::span<const 
       for (int m = 0; m < order; ++m) {
         free += Load4(c + m * t + n - 1) * Splat4(entry[order - 1 - m]);
       }
-      Store4(&full_[j], Load4(&full_[j]) + free);
+      Store4(&full[j], Load4(&full[j]) + free);
     }
     for (; j < end; ++j) {
       const int n = j - start + 1;
       float free = 0.0f;
       for (int m = 0; m < order; ++m) free += c[m * t + n - 1] * entry[order - 1 - m];
-      full_[j] += free;
+      full[j] += free;
     }
   }
-  std::copy(full_.begin() + d, full_.begin() + total, output);
+  std::copy(full + d, full + total, data);
 }
 
 }  // namespace audio_sorvane

@@ -33,6 +33,10 @@ class AlignedGammaSmoother {
   // buffer can be read in place); `output` receives first.size() +
   // second.size() values and must not overlap the input.
   void Smooth(std::span<const float> first, std::span<const float> second, float* output);
+  // Smooth in place: data[0, length) is the input and receives the output;
+  // data must hold PaddedLength(length) floats (the rest is scratch).
+  void SmoothInPlace(float* data, int length);
+  int PaddedLength(int length) const;
   void SmoothReference(std::span<const float> first, std::span<const float> second,
                        float* output) const;
 
@@ -50,7 +54,7 @@ class AlignedGammaSmoother {
   // n = 1 .. table_length_.
   std::vector<float> coefficients_;
   int table_length_ = 0;
-  std::vector<float> input_, full_;  // scratch
+  std::vector<float> input_;  // scratch of Smooth
 };
 
 }  // namespace audio_sorvane
