@@ -1,7 +1,7 @@
 // Four (or eight) floats as one value, for inner loops that the compiler should keep
 // in SIMD registers: GCC and Clang map the arithmetic to SSE on x86 and
-// NEON on ARM, and to scalar code elsewhere. Loads and stores go through
-// memcpy, so pointers need no alignment.
+// NEON on ARM, and to scalar code elsewhere. Loads and stores need no
+// alignment beyond a float's.
 #ifndef AUDIO_DSP_FLOAT4_H_
 #define AUDIO_DSP_FLOAT4_H_
 
@@ -11,13 +11,14 @@ namespace audio_dsp {
 
 typedef float Float4 __attribute__((vector_size(16)));
 
-inline Float4 Load4(const float* p) {
-  Float4 v;
-  std::memcpy(&v, p, sizeof(v));
-  return v;
-}
+// Float4 at any float-aligned address, allowed to alias floats: one
+// unaligned vector load or store (memcpy into a vector went through
+// general registers and the stack on AArch64).
+typedef float UnalignedFloat4 __attribute__((vector_size(16), aligned(4), may_alias));
 
-inline void Store4(float* p, Float4 v) { std::memcpy(p, &v, sizeof(v)); }
+inline Float4 Load4(const float* p) { return *reinterpret_cast<const UnalignedFloat4*>(p); }
+
+inline void Store4(float* p, Float4 v) { *reinterpret_cast<UnalignedFloat4*>(p) = v; }
 
 inline Float4 Splat4(float x) { return Float4{x, x, x, x}; }
 

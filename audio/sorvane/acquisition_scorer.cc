@@ -6,6 +6,7 @@
 #include <cstring>
 #include <numbers>
 
+#include "audio/dsp/float4.h"
 #include "audio/sorvane/sorvane_util.h"
 #include "base/logging.h"
 
@@ -14,17 +15,25 @@ namespace {
 
 using audio_dsp::FloatVector;
 
-// Eight floats, with GCC/Clang vector extensions: the same source becomes
-// SSE or NEON register pairs, or single AVX2 registers in the x86-64 clone
-// chosen at load time. The portable way to vectorise these loops on both
-// targets without intrinsics.
+// Eight floats per value. On x86 a GCC/Clang 32-byte vector: SSE register
+// pairs, or single AVX2 registers in the clone chosen at load time. Loads
+// and horizontal sums are macros, not functions: a 32-byte vector passed to
+// or returned from a function outside an AVX context changes the calling
+// convention, which compilers reject or warn about. Elsewhere (NEON) two
+// 16-byte halves: a 32-byte vector type there is lowered through the stack.
+#if defined(__x86_64__)
 typedef float Float8 __attribute__((vector_size(32)));
-// Loads and horizontal sums are macros, not functions: a 32-byte vector
-// passed to or returned from a function outside an AVX context changes the
-// calling convention, which compilers reject or warn about.
 #define SORVEL_LOAD8(name, pointer) \
   Float8 name;                      \
   std::memcpy(&name, (pointer), sizeof(Float8))
+#define SORVEL_STORE8(pointer, v) std::memcpy((pointer), &(v), sizeof(Float8))
+#define SORVEL_SPLAT8(x) (Float8{} + (x))
+#else
+using audio_dsp::Float8;
+#define SORVEL_LOAD8(name, pointer) const Float8 name = audio_dsp::Load8(pointer)
+#define SORVEL_STORE8(pointer, v) audio_dsp::Store8((pointer), (v))
+#define SORVEL_SPLAT8(x) audio_dsp::Splat8(x)
+#endif
 #define SORVEL_SUM8(v) (((v)[0] + (v)[1]) + ((v)[2] + (v)[3]) + (((v)[4] + (v)[5]) + ((v)[6] + (v)[7])))
 
 #if defined(__x86_64__) && defined(__ELF__)
@@ -81,11 +90,11 @@ SORVEL_MULTIVERSION void CorrelateChunks8(const float* code, const float* frame_
     for (int k = 0; k < size; ++k) {
       SORVEL_LOAD8(rv, re + k);
       SORVEL_LOAD8(iv, im + k);
-      sum_re += t[k] * rv;
-      sum_im += t[k] * iv;
+      sum_re += SORVEL_SPLAT8(t[k]) * rv;
+      sum_im += SORVEL_SPLAT8(t[k]) * iv;
     }
-    std::memcpy(out_real + 8 * c, &sum_re, sizeof(sum_re));
-    std::memcpy(out_imaginary + 8 * c, &sum_im, sizeof(sum_im));
+    SORVEL_STORE8(out_real + 8 * c, sum_re);
+    SORVEL_STORE8(out_imaginary + 8 * c, sum_im);
   }
 }
 
@@ -103,11 +112,11 @@ SORVEL_MULTIVERSION void FrequencyPowers8(const float* phasors_real,
     for (int c = 0; c < num_chunks; ++c) {
       SORVEL_LOAD8(x, corr_real + 8 * c);
       SORVEL_LOAD8(y, corr_imaginary + 8 * c);
-      acc_re += pr[c] * x - pi[c] * y;
-      acc_im += pr[c] * y + pi[c] * x;
+      acc_re += SORVEL_SPLAT8(pr[c]) * x - SORVEL_SPLAT8(pi[c]) * y;
+      acc_im += SORVEL_SPLAT8(pr[c]) * y + SORVEL_SPLAT8(pi[c]) * x;
     }
     const Float8 p = acc_re * acc_re + acc_im * acc_im;
-    std::memcpy(out + 8 * i, &p, sizeof(p));
+    SORVEL_STORE8(out + 8 * i, p);
   }
 }
 
@@ -131,17 +140,18 @@ SORVEL_MULTIVERSION void PairedFrequencyPowers8(const float* cosines, const floa
     for (int c = 0; c < num_chunks; ++c) {
       SORVEL_LOAD8(x, corr_real + 8 * c);
       SORVEL_LOAD8(y, corr_imaginary + 8 * c);
-      ar += cs[c] * x;
-      ai += cs[c] * y;
-      br += sn[c] * x;
-      bi += sn[c] * y;
+      const Float8 cv = SORVEL_SPLAT8(cs[c]), sv = SORVEL_SPLAT8(sn[c]);
+      ar += cv * x;
+      ai += cv * y;
+      br += sv * x;
+      bi += sv * y;
     }
     const Float8 plus_re = ar - bi, plus_im = ai + br;
     const Float8 minus_re = ar + bi, minus_im = ai - br;
     const Float8 plus = plus_re * plus_re + plus_im * plus_im;
     const Float8 minus = minus_re * minus_re + minus_im * minus_im;
-    std::memcpy(out + 8 * p, &plus, sizeof(plus));
-    std::memcpy(out + 8 * (n - 1 - p), &minus, sizeof(minus));
+    SORVEL_STORE8(out + 8 * p, plus);
+    SORVEL_STORE8(out + 8 * (n - 1 - p), minus);
   }
   if (has_zero) {
     Float8 re = {}, im = {};
@@ -152,7 +162,7 @@ SORVEL_MULTIVERSION void PairedFrequencyPowers8(const float* cosines, const floa
       im += y;
     }
     const Float8 p = re * re + im * im;
-    std::memcpy(out + 8 * num_pairs, &p, sizeof(p));
+    SORVEL_STORE8(out + 8 * num_pairs, p);
   }
 }
 
@@ -168,12 +178,12 @@ SORVEL_MULTIVERSION void FrequencyPowers(const float* phasors_real,
     for (int c = 0; c < num_chunks; ++c) {
       SORVEL_LOAD8(a, phasors_real + c * padded + i);
       SORVEL_LOAD8(b, phasors_imaginary + c * padded + i);
-      const float x = corr_real[c], y = corr_imaginary[c];
+      const Float8 x = SORVEL_SPLAT8(corr_real[c]), y = SORVEL_SPLAT8(corr_imaginary[c]);
       acc_re += a * x - b * y;
       acc_im += a * y + b * x;
     }
     const Float8 p = acc_re * acc_re + acc_im * acc_im;
-    std::memcpy(power + i, &p, sizeof(p));
+    SORVEL_STORE8(power + i, p);
   }
 }
 
