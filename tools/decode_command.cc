@@ -55,11 +55,24 @@ class AudioSource {
     samples->resize(frames * channels_);
     size_t got = 0;
     if (file_ != nullptr) {
-      // Float reads keep any format's full resolution (short reads of a
-      // float file return only -1, 0 and 1); scale to the 16-bit range.
-      got = static_cast<size_t>(sf_readf_float(file_, samples->data(),
-                                               static_cast<sf_count_t>(frames)));
-      for (float& v : *samples) v = std::clamp(v * 32768.0f, -32768.0f, 32767.0f);
+      // Files are read a few hundred milliseconds at a time (one read per
+      // block cost more system time than a DTMF decoder spends on it) and
+      // handed out in blocks.
+      if (next_ == chunk_.size()) {
+        const size_t chunk_frames = 32 * frames;
+        chunk_.resize(chunk_frames * channels_);
+        // Float reads keep any format's full resolution (short reads of a
+        // float file return only -1, 0 and 1); scale to the 16-bit range.
+        const size_t read = static_cast<size_t>(sf_readf_float(
+            file_, chunk_.data(), static_cast<sf_count_t>(chunk_frames)));
+        chunk_.resize(read * channels_);
+        for (float& v : chunk_) v = std::clamp(v * 32768.0f, -32768.0f, 32767.0f);
+        next_ = 0;
+      }
+      const size_t n = std::min(frames * channels_, chunk_.size() - next_);
+      std::copy_n(chunk_.begin() + static_cast<std::ptrdiff_t>(next_), n, samples->begin());
+      next_ += n;
+      got = n / channels_;
     } else {
       raw_.resize(frames * channels_ * 2);
       const size_t bytes = std::fread(raw_.data(), 1, raw_.size(), stdin);
@@ -79,6 +92,8 @@ class AudioSource {
   float rate_ = 0.0f;
   int channels_ = 1;
   std::vector<uint8_t> raw_;
+  std::vector<float> chunk_;  // file samples read ahead, from next_ on
+  size_t next_ = 0;
 };
 
 int Run(DecodeOptions& o) {
