@@ -18,12 +18,13 @@ namespace {
 
 using audio_sorvane::AudioModemDecoder;
 
-// The decoder the config byte picks. DSSS and multi-tone decoders are kept
-// between runs (24 settings in all) and wiped; hotsound ones are built per
-// run, as a wipe leaves their wake-up state as it was.
+// The decoder the config byte picks. DSSS decoders are kept between runs
+// (8 settings in all) and wiped; the others are built per run, as a wipe
+// leaves the hotsound wake-up state as it was and a wiped multi-tone decoder
+// can answer differently from a new one.
 AudioModemDecoder* PickDecoder(uint8_t config, int channels, float rate,
                                std::unique_ptr<AudioModemDecoder>& fresh) {
-  static sorvel_fuzz::DecoderCache cache(24);
+  static sorvel_fuzz::DecoderCache cache(8);
   if (config % 3 != 2) {
     audio_sorvane::DsssDecoderConfig dsss;
     dsss.num_channels = channels;
@@ -41,8 +42,8 @@ AudioModemDecoder* PickDecoder(uint8_t config, int channels, float rate,
   dtmf.num_channels = channels;
   dtmf.input_sample_rate = rate;
   dtmf.tones.use_checksum_symbol = (config & 16) != 0;
-  return cache.Get(sorvel_fuzz::SettingsKey(dtmf),
-                   [&] { return audio_sorvane::MakeDtmfDecoder(dtmf); });
+  fresh = audio_sorvane::MakeDtmfDecoder(dtmf);
+  return fresh.get();
 }
 
 }  // namespace

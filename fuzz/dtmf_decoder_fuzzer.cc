@@ -3,8 +3,10 @@
 // token requests between blocks. Any settings the validator accepts, and
 // any audio, must run without a crash, a sanitizer report or a fatal check;
 // an ADSR window that does not fit the frame is refused, not fatal.
-// Decoders are kept between runs by their settings and wiped before each
-// run.
+// Each run builds its decoder: a wiped multi-tone decoder can answer
+// differently from a new one (fuzz/regressions/dtmf_decoder). With
+// SORVEL_FUZZ_CHECK_REUSE set, decoders are kept and wiped, and each run is
+// compared with one on a new decoder.
 //
 // Input: the settings block (ReadDtmfSettings), then the audio script.
 #include <cstddef>
@@ -27,7 +29,7 @@ extern "C" int LLVMFuzzerInitialize(int*, char***) {
 }
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-  static sorvel_fuzz::DecoderCache cache(256);
+  static sorvel_fuzz::DecoderCache cache(sorvel_fuzz::CheckReuse() ? 256 : 0);
   sorvel_fuzz::FuzzInput in(data, size);
   const audio_sorvane::DtmfDecoderConfig config = sorvel_fuzz::ReadDtmfSettings(in);
   // Frames too short for the decimation: the validator refuses those.

@@ -336,14 +336,14 @@ DecoderCache::~DecoderCache() {
 audio_sorvane::AudioModemDecoder* DecoderCache::Get(const std::string& key, const Maker& make) {
   ++uses_;
   for (Entry& entry : entries_) {
-    if (entry.key == key) {
+    if (capacity_ > 0 && entry.key == key) {
       entry.last_use = uses_;
       if (entry.decoder) entry.decoder->WipeInternalData();
       return entry.decoder.get();
     }
   }
   ++builds_;
-  if (entries_.size() >= capacity_) {
+  if (!entries_.empty() && entries_.size() >= std::max<size_t>(capacity_, 1)) {
     const auto oldest = std::min_element(
         entries_.begin(), entries_.end(),
         [](const Entry& a, const Entry& b) { return a.last_use < b.last_use; });
@@ -353,13 +353,17 @@ audio_sorvane::AudioModemDecoder* DecoderCache::Get(const std::string& key, cons
   return entries_.back().decoder.get();
 }
 
+bool CheckReuse() {
+  static const bool check = std::getenv("SORVEL_FUZZ_CHECK_REUSE") != nullptr;
+  return check;
+}
+
 void RunCached(DecoderCache& cache, const std::string& key, const DecoderCache::Maker& make,
                const std::function<uint64_t(audio_sorvane::AudioModemDecoder&)>& run) {
-  static const bool check = std::getenv("SORVEL_FUZZ_CHECK_REUSE") != nullptr;
   audio_sorvane::AudioModemDecoder* decoder = cache.Get(key, make);
   if (decoder == nullptr) return;
   const uint64_t reused = run(*decoder);
-  if (!check) return;
+  if (!CheckReuse()) return;
   const auto fresh = make();
   if (run(*fresh) != reused) {
     std::fprintf(stderr, "A wiped decoder answered differently from a new one\n");

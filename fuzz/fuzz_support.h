@@ -121,8 +121,11 @@ std::string SettingsKey(const audio_sorvane::DtmfDecoderConfig& config);
 // run. Get hands out the decoder wiped (WipeInternalData puts the DSSS and
 // multi-tone decoders back to their state after Initialize), so nothing of
 // one run reaches the next; the hotsound kind keeps its wake-up state over
-// a wipe and must not be cached. Holds at most `capacity` decoders and drops
-// the least recently used. Not thread safe.
+// a wipe and must not be cached, and so does the multi-tone one (a wiped
+// multi-tone decoder can answer differently from a new one:
+// fuzz/regressions/dtmf_decoder). Holds at most `capacity` decoders and
+// drops the least recently used; a capacity of 0 builds on every Get. Not
+// thread safe.
 class DecoderCache {
  public:
   using Maker = std::function<std::unique_ptr<audio_sorvane::AudioModemDecoder>()>;
@@ -145,6 +148,9 @@ class DecoderCache {
   uint64_t builds_ = 0;
   std::vector<Entry> entries_;
 };
+
+// Whether SORVEL_FUZZ_CHECK_REUSE is set in the environment.
+bool CheckReuse();
 
 // Runs `run` on the cached decoder for `key` (a null decoder skips it).
 // With SORVEL_FUZZ_CHECK_REUSE set in the environment it runs again on a

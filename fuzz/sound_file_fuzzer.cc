@@ -1,13 +1,11 @@
 // The command-line tool's input reading on arbitrary file images (any
 // format libsndfile recognises), then the samples through a decoder when
-// the header describes something a phone could record. Decoders are kept
-// between runs by channel count and rate, and wiped before each run.
+// the header describes something a phone could record.
 #include <cstddef>
 #include <cstdint>
 #include <span>
 
 #include "audio/modem_config.h"
-#include "fuzz/fuzz_support.h"
 #include "tools/wav_io.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
@@ -22,9 +20,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   audio_sorvane::DtmfDecoderConfig config;
   config.num_channels = wav.channels;
   config.input_sample_rate = static_cast<float>(wav.sample_rate);
-  static sorvel_fuzz::DecoderCache cache(16);
-  audio_sorvane::AudioModemDecoder* decoder = cache.Get(
-      sorvel_fuzz::SettingsKey(config), [&] { return audio_sorvane::MakeDtmfDecoder(config); });
+  const auto decoder = audio_sorvane::MakeDtmfDecoder(config);
   decoder->ProcessSamples(wav.samples);
   audio_sorvane::AudioModemDecoder::DecodeResults results;
   decoder->DecodeTokens(&results, 3, 2);
