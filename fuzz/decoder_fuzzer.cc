@@ -12,30 +12,38 @@
 #include <vector>
 
 #include "audio/modem_config.h"
+#include "fuzz/fuzz_support.h"
 
 namespace {
 
 using audio_sorvane::AudioModemDecoder;
 
-std::unique_ptr<AudioModemDecoder> MakeDecoder(uint8_t config, int channels, float rate) {
-  switch (config % 3) {
-    case 0:
-    case 1: {
-      audio_sorvane::DsssDecoderConfig dsss;
-      dsss.num_channels = channels;
-      dsss.input_sample_rate = rate;
-      dsss.with_hotsound = config % 3 == 1;
-      dsss.append_check_symbol = (config & 16) != 0;
-      return audio_sorvane::MakeDsssDecoder(dsss);
+// The decoder the config byte picks. DSSS decoders are kept between runs
+// (8 settings in all) and wiped; the others are built per run, as a wipe
+// leaves the hotsound wake-up state as it was and a wiped multi-tone decoder
+// can answer differently from a new one.
+AudioModemDecoder* PickDecoder(uint8_t config, int channels, float rate,
+                               std::unique_ptr<AudioModemDecoder>& fresh) {
+  static sorvel_fuzz::DecoderCache cache(8);
+  if (config % 3 != 2) {
+    audio_sorvane::DsssDecoderConfig dsss;
+    dsss.num_channels = channels;
+    dsss.input_sample_rate = rate;
+    dsss.with_hotsound = config % 3 == 1;
+    dsss.append_check_symbol = (config & 16) != 0;
+    if (dsss.with_hotsound) {
+      fresh = audio_sorvane::MakeDsssDecoder(dsss);
+      return fresh.get();
     }
-    default: {
-      audio_sorvane::DtmfDecoderConfig dtmf;
-      dtmf.num_channels = channels;
-      dtmf.input_sample_rate = rate;
-      dtmf.tones.use_checksum_symbol = (config & 16) != 0;
-      return audio_sorvane::MakeDtmfDecoder(dtmf);
-    }
+    return cache.Get(sorvel_fuzz::SettingsKey(dsss),
+                     [&] { return audio_sorvane::MakeDsssDecoder(dsss); });
   }
+  audio_sorvane::DtmfDecoderConfig dtmf;
+  dtmf.num_channels = channels;
+  dtmf.input_sample_rate = rate;
+  dtmf.tones.use_checksum_symbol = (config & 16) != 0;
+  fresh = audio_sorvane::MakeDtmfDecoder(dtmf);
+  return fresh.get();
 }
 
 }  // namespace
@@ -45,7 +53,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const uint8_t config = data[0];
   const int channels = (config & 4) ? 2 : 1;
   const float rate = (config & 8) ? 48000.0f : 44100.0f;
-  const auto decoder = MakeDecoder(config, channels, rate);
+  std::unique_ptr<AudioModemDecoder> fresh;
+  AudioModemDecoder* decoder = PickDecoder(config, channels, rate, fresh);
   const int message_bytes = decoder->token_length_bytes() - 2;
   AudioModemDecoder::DecodeResults results;
   std::vector<float> block;

@@ -3,6 +3,9 @@
 #include <algorithm>
 #include <array>
 #include <cmath>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
 
 #include "audio/hotsound_detector.h"
 #include "audio/sorvane/code_signal_generator.h"
@@ -30,12 +33,13 @@ std::span<const float> SampleRates() {
   return kRates;
 }
 
-namespace {
-
-// A byte as a value in [lo, hi]; 0 gives `fallback`, 1 gives lo, 255 hi.
 float Level(uint8_t b, float lo, float hi, float fallback) {
-  return b == 0 ? fallback : lo + (hi - lo) * static_cast<float>(b - 1) / 254.0f;
+  if (b == 0) return fallback;
+  const int level = (b - 1) * kLevels / 255;  // 1 gives lo, 255 hi
+  return lo + (hi - lo) * static_cast<float>(level) / (kLevels - 1);
 }
+
+namespace {
 
 // Bounds on the DSSS frame (samples per frame, and that times the alphabet)
 // above which the upsampling multiple, the decimation and then the code
@@ -113,7 +117,8 @@ DtmfDecoderConfig ReadDtmfSettings(FuzzInput& in) {
   const int tones = in.Byte() % 11;
   std::vector<float> frequencies;
   for (int i = 0; i < 12; ++i) {
-    const float f = in.Byte() / 256.0f * t.sample_rate / 2;  // below half the rate
+    // 64 steps below half the rate.
+    const float f = (in.Byte() & ~3) / 256.0f * t.sample_rate / 2;
     if (tones != 0 && i < tones + 2) frequencies.push_back(f);
   }
   const uint8_t k = in.Byte();
@@ -130,8 +135,8 @@ DtmfDecoderConfig ReadDtmfSettings(FuzzInput& in) {
   }
   if (flags & 2) {
     const float w = t.window_duration;
-    t.adsr = {{in.Byte() / 255.0f * w / 3, in.Byte() / 255.0f * w / 3, in.Byte() / 255.0f * w / 3,
-               in.Byte() / 255.0f * w / 3, in.Byte() / 255.0f}};
+    const auto part = [&] { return Level(in.Byte(), 0.0f, 1.0f, 0.0f); };
+    t.adsr = {{part() * w / 3, part() * w / 3, part() * w / 3, part() * w / 3, part()}};
   } else {
     for (int i = 0; i < 5; ++i) in.Byte();
   }
@@ -165,30 +170,33 @@ void RunAudioScript(FuzzInput& in, int channels, int max_frames,
       case 0:
         block.resize(static_cast<size_t>(n + 1) * channels);
         for (int16_t& s : block) s = in.Sample();
-        if (!send(block, true)) return;
+        send(block, true);
         break;
       case 1:
+        if (fed + (n + 1) * 256 > max_frames) break;  // not rendered past the budget
         block.assign(static_cast<size_t>(n + 1) * 256 * channels, 0);
-        if (!send(block, true)) return;
+        send(block, true);
         break;
       case 2: {
         const int amplitude = 128 * in.Byte();
+        if (fed + (n + 1) * 256 > max_frames) break;
         block.resize(static_cast<size_t>(n + 1) * 256 * channels);
         for (int16_t& s : block) {
           noise = noise * 1664525u + 1013904223u;
           s = static_cast<int16_t>(static_cast<int>(noise >> 16) % (amplitude + 1) -
                                    amplitude / 2);
         }
-        if (!send(block, true)) return;
+        send(block, true);
         break;
       }
       case 3: {
         // Fed again in blocks of the size the script last used.
         const size_t step = std::max<size_t>(block.size(), channels);
-        for (int i = 0; i <= n % 4; ++i) {
-          for (size_t start = 0; start < loop.size(); start += step) {
+        bool fits = true;
+        for (int i = 0; i <= n % 4 && fits; ++i) {
+          for (size_t start = 0; start < loop.size() && fits; start += step) {
             const size_t count = std::min(step, loop.size() - start);
-            if (!send(std::span<const int16_t>(loop).subspan(start, count), false)) return;
+            fits = send(std::span<const int16_t>(loop).subspan(start, count), false);
           }
         }
         loop.clear();
@@ -201,7 +209,13 @@ void RunAudioScript(FuzzInput& in, int channels, int max_frames,
   }
 }
 
-void Act(audio_sorvane::AudioModemDecoder& decoder, uint8_t a) {
+void Digest::Add(int64_t value) {
+  for (int i = 0; i < 8; ++i) {
+    hash_ = (hash_ ^ static_cast<uint8_t>(value >> (8 * i))) * 1099511628211ull;
+  }
+}
+
+void Act(audio_sorvane::AudioModemDecoder& decoder, uint8_t a, Digest& digest) {
   audio_sorvane::AudioModemDecoder::DecodeResults results;
   const int length = decoder.token_length_bytes();
   int expected = -1;  // bytes per returned token
@@ -209,17 +223,21 @@ void Act(audio_sorvane::AudioModemDecoder& decoder, uint8_t a) {
     case 0:
     case 1:
       if (length > 2 && decoder.DecodeTokens(&results, length - 2, 2)) expected = length - 2;
+      for (float t : results.detection_times) digest.Add(std::lround(t * 1e4f));
       break;
     case 2:
     case 3:
       if (decoder.DecodeTokens(&results, length, 0)) expected = length;
       break;
     case 4:
-      decoder.DetectBroadcaster();
+      digest.Add(decoder.DetectBroadcaster());
       break;
-    case 5:
-      if (decoder.GetMaxSafeInputSize() < 0) __builtin_trap();
+    case 5: {
+      const int size = decoder.GetMaxSafeInputSize();
+      if (size < 0) __builtin_trap();
+      digest.Add(size);
       break;
+    }
     case 6:
       decoder.WipeInternalData();
       break;
@@ -230,8 +248,12 @@ void Act(audio_sorvane::AudioModemDecoder& decoder, uint8_t a) {
       break;
     }
   }
+  digest.Add(expected);
   for (const auto& token : results.tokens) {
     if (static_cast<int>(token.bytes.size()) != expected) __builtin_trap();
+    for (uint8_t b : token.bytes) digest.Add(b);
+    digest.Add(token.position);
+    digest.Add(token.score_millis);
   }
 }
 
@@ -249,9 +271,10 @@ void QuietLogs() {
   sorvel_base::SetLogSink(&sink);
 }
 
-void RunDecoderScript(FuzzInput& in, audio_sorvane::AudioModemDecoder& decoder, int channels,
-                      int max_frames,
-                      const std::function<void(std::span<const int16_t>)>& feed) {
+uint64_t RunDecoderScript(FuzzInput& in, audio_sorvane::AudioModemDecoder& decoder,
+                          int channels, int max_frames,
+                          const std::function<void(std::span<const int16_t>)>& feed) {
+  Digest digest;
   int requests = 0;
   RunAudioScript(
       in, channels, max_frames,
@@ -263,9 +286,89 @@ void RunDecoderScript(FuzzInput& in, audio_sorvane::AudioModemDecoder& decoder, 
         }
       },
       [&](uint8_t a) {
-        if (++requests <= kMaxRequests) Act(decoder, a);
+        if (++requests <= kMaxRequests) Act(decoder, a, digest);
       });
-  if (requests == 0) Act(decoder, 0);
+  if (requests == 0) Act(decoder, 0, digest);
+  return digest.value();
+}
+
+namespace {
+
+// Appends the bytes of each value.
+template <typename... T>
+void Append(std::string& key, const T&... values) {
+  (key.append(reinterpret_cast<const char*>(&values), sizeof(values)), ...);
+}
+
+}  // namespace
+
+std::string SettingsKey(const DsssDecoderConfig& c) {
+  std::string key = "dsss";
+  const auto& coder = c.coder;
+  Append(key, coder.number_of_taps, coder.code_number, coder.upsampling_factor,
+         coder.bits_per_symbol, coder.min_cycles_per_frame, coder.baseband_decimation_factor,
+         coder.use_quadrature, coder.sample_rate, coder.desired_carrier_frequency);
+  Append(key, c.token_length_bytes, c.append_check_symbol, c.save_received_samples,
+         c.max_candidates_to_return, c.num_channels, c.with_hotsound, c.detection_duration,
+         c.detection_threshold, c.input_sample_rate, c.buffer_duration_factor);
+  return key;
+}
+
+std::string SettingsKey(const DtmfDecoderConfig& c) {
+  std::string key = "dtmf";
+  const auto& t = c.tones;
+  Append(key, t.bytes_in_token, t.use_checksum_symbol, t.baseband_decimation_factor,
+         t.tones_per_symbol, t.sample_rate, t.window_duration, t.adsr.has_value());
+  for (float f : t.tone_frequencies) Append(key, f);
+  if (t.adsr) Append(key, *t.adsr);
+  Append(key, c.max_candidates_per_decode_token_call, c.num_channels, c.input_sample_rate,
+         c.buffer_duration_factor);
+  return key;
+}
+
+DecoderCache::~DecoderCache() {
+  if (std::getenv("SORVEL_FUZZ_CACHE_STATS") != nullptr) {
+    std::fprintf(stderr, "decoder cache: %llu uses, %llu builds\n",
+                 static_cast<unsigned long long>(uses_), static_cast<unsigned long long>(builds_));
+  }
+}
+
+audio_sorvane::AudioModemDecoder* DecoderCache::Get(const std::string& key, const Maker& make) {
+  ++uses_;
+  for (Entry& entry : entries_) {
+    if (capacity_ > 0 && entry.key == key) {
+      entry.last_use = uses_;
+      if (entry.decoder) entry.decoder->WipeInternalData();
+      return entry.decoder.get();
+    }
+  }
+  ++builds_;
+  if (!entries_.empty() && entries_.size() >= std::max<size_t>(capacity_, 1)) {
+    const auto oldest = std::min_element(
+        entries_.begin(), entries_.end(),
+        [](const Entry& a, const Entry& b) { return a.last_use < b.last_use; });
+    entries_.erase(oldest);
+  }
+  entries_.push_back({key, make(), uses_});
+  return entries_.back().decoder.get();
+}
+
+bool CheckReuse() {
+  static const bool check = std::getenv("SORVEL_FUZZ_CHECK_REUSE") != nullptr;
+  return check;
+}
+
+void RunCached(DecoderCache& cache, const std::string& key, const DecoderCache::Maker& make,
+               const std::function<uint64_t(audio_sorvane::AudioModemDecoder&)>& run) {
+  audio_sorvane::AudioModemDecoder* decoder = cache.Get(key, make);
+  if (decoder == nullptr) return;
+  const uint64_t reused = run(*decoder);
+  if (!CheckReuse()) return;
+  const auto fresh = make();
+  if (run(*fresh) != reused) {
+    std::fprintf(stderr, "A wiped decoder answered differently from a new one\n");
+    __builtin_trap();
+  }
 }
 
 }  // namespace sorvel_fuzz

@@ -2,7 +2,10 @@
 // settings taken from the input, fed through the facade's float and 16-bit
 // paths. Its activity clock runs on the audio fed, so runs repeat exactly.
 // Any settings the validators and the tool accept, and any audio, must run
-// without a crash, a sanitizer report or a fatal check.
+// without a crash, a sanitizer report or a fatal check. Each run builds its
+// decoder: a wipe leaves the wake-up state (detector, pre-trigger audio,
+// activity time) as it was, so a kept decoder would carry one run into the
+// next.
 //
 // Input: the settings block (ReadDsssSettings with the hotsound rates), one
 // byte whose low bit picks the 16-bit path, then the audio script.

@@ -62,13 +62,13 @@ Bytes ShortDsssSettings() {
   return settings;
 }
 
-// Settings bytes (ReadDtmfSettings) for 10 ms frames and 4-byte tokens;
+// Settings bytes (ReadDtmfSettings) for 8 ms frames and 4-byte tokens;
 // with `own_tones`, six tones from 1 kHz taken two at a time and an ADSR
 // window.
 Bytes ShortDtmfSettings(bool own_tones) {
   Bytes settings(sorvel_fuzz::kDtmfSettingsBytes, 0);
   settings[0] = sorvel_fuzz::PickByte(1, 12, 5, 4);
-  settings[4] = 11;  // window about 10 ms
+  settings[4] = 11;  // window about 8 ms
   if (own_tones) {
     settings[1] = 2;  // ADSR
     settings[5] = 4;  // six tones

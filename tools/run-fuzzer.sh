@@ -2,9 +2,11 @@
 # Runs one libFuzzer target of a fuzz build on its corpus and prints the
 # executions, the rate and the final coverage (cov: edges, ft: features).
 # The whole output stays in <build>/<name>.log. Fails on any finding.
-#   run-fuzzer.sh <build dir> <name> <stopping flag, e.g. -runs=1000000>
+#   run-fuzzer.sh <build dir> <name> <stopping flags, e.g. -runs=1000000>
 set -uo pipefail
-build=$1 name=$2 stop=$3
+build=$1 name=$2
+shift 2
+stop=("$@")
 
 # Short inputs for the per-decoder and registry fuzzers (a settings block
 # and an audio script); the hotsound one needs a whole default broadcast,
@@ -12,7 +14,11 @@ build=$1 name=$2 stop=$3
 case $name in
   dsss_decoder | dtmf_decoder | decoder_registry) max_len=16384 ;;
   hotsound_decoder) max_len=70000 ;;
-  *) max_len=120000 ;;
+  decoder) max_len=120000 ;;
+  # A WAV image of the 8000-sample seeds.
+  sound_file) max_len=20000 ;;
+  # Symbol strings and score maps: longer inputs only cost time.
+  *) max_len=4096 ;;
 esac
 
 # Inputs that once failed are read with the corpus (new units go to the
@@ -22,9 +28,10 @@ extra=()
 if [ -d "$regressions" ]; then extra=("$regressions"); fi
 
 log=$build/${name}.log
-echo "== ${name}_fuzzer $stop"
+# One process per corpus: no other process adds units to reread.
+echo "== ${name}_fuzzer ${stop[*]}"
 start=$(date +%s)
-"$build/fuzz/${name}_fuzzer" "$stop" -max_len=$max_len -rss_limit_mb=4096 \
+"$build/fuzz/${name}_fuzzer" "${stop[@]}" -max_len=$max_len -rss_limit_mb=4096 -reload=0 \
   -print_final_stats=1 "$build/corpus/$name" "${extra[@]}" >"$log" 2>&1
 rc=$?
 seconds=$(($(date +%s) - start))
