@@ -4,7 +4,9 @@
 // any audio, must run without a crash, a sanitizer report or a fatal check;
 // an ADSR window that does not fit the frame is refused, not fatal.
 // Each run builds its decoder: a wiped multi-tone decoder can answer
-// differently from a new one (fuzz/regressions/dtmf_decoder). With
+// differently from a new one (fuzz/regressions/dtmf_decoder), because its
+// tone oscillators run on across the reset and meet the audio at another
+// phase; zeroing them there makes the two agree on that input. With
 // SORVEL_FUZZ_CHECK_REUSE set, decoders are kept and wiped, and each run is
 // compared with one on a new decoder.
 //
