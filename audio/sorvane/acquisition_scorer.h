@@ -122,7 +122,7 @@ class AcquisitionScorer {
   std::vector<float> phasors_imaginary_;
   std::vector<float> powers_;        // padded_frequencies_ scratch
   mutable audio_dsp::FloatVector detection_sums_;  // DetectionScore's scratch
-  std::vector<float> batch_real_;    // 8 frames' correlations per chunk
+  std::vector<float> batch_real_;    // 16 frames' correlations per chunk
   std::vector<float> batch_imaginary_;
   std::vector<float> batch_powers_;      // 8 frames per frequency
   std::vector<float> matrix_real_;       // the phasors by frequency
