@@ -34,6 +34,35 @@ float Mean(std::span<const float> first, std::span<const float> second, int begi
   return static_cast<float>(sum / (end - begin));
 }
 
+// The free-response coefficients c_m(n) = p^n C(n + m - 1, m) (1 - p)^m
+// for n = 1, 2, ... in turn, m < order: the response of stage m to a unit
+// state in stage 0 after n steps. Generated as needed rather than tabled,
+// so the smoother holds no tables that grow with the input.
+class FreeResponse {
+ public:
+  FreeResponse(double pole, int order) : pole_(pole), g_(1.0 - pole), order_(order) {}
+  // Moves to the next n and writes c_m(n) to out[m * stride].
+  void Next(float* out, int stride) {
+    ++n_;
+    pn_ *= pole_;
+    double b = 1.0;  // C(n + m - 1, m) g^m
+    for (int m = 0; m < order_; ++m) {
+      if (m > 0) b *= (n_ + m - 1) * g_ / m;
+      out[m * stride] = static_cast<float>(pn_ * b);
+    }
+  }
+  void Skip() {
+    ++n_;
+    pn_ *= pole_;
+  }
+
+ private:
+  double pole_, g_;
+  int order_;
+  int n_ = 0;
+  double pn_ = 1.0;  // p^n
+};
+
 }  // namespace
 
 void AlignedGammaSmoother::SmoothReference(std::span<const float> first,
@@ -56,22 +85,6 @@ void AlignedGammaSmoother::SmoothReference(std::span<const float> first,
   filter.ProcessBlock(x.data() + d, length - d, output);
   std::fill(scratch.begin(), scratch.end(), tail);
   filter.ProcessBlock(scratch.data(), d, output + (length - d));
-}
-
-void AlignedGammaSmoother::EnsureTables(int length) {
-  if (length <= table_length_) return;
-  table_length_ = length;
-  coefficients_.assign(static_cast<size_t>(order_) * length, 0.0f);
-  const double g = 1.0 - pole_;
-  double pn = 1.0;
-  for (int n = 1; n <= length; ++n) {
-    pn *= pole_;
-    double b = 1.0;  // C(n + m - 1, m) g^m
-    for (int m = 0; m < order_; ++m) {
-      if (m > 0) b *= (n + m - 1) * g / m;
-      coefficients_[static_cast<size_t>(m) * length + n - 1] = static_cast<float>(pn * b);
-    }
-  }
 }
 
 int AlignedGammaSmoother::PaddedLength(int length) const {
@@ -110,7 +123,6 @@ void AlignedGammaSmoother::SmoothInPlace(float* data, int length) {
   // in place.
   const int total = length + d;
   const int segment = (total + kLanes - 1) / kLanes;
-  EnsureTables(segment);
   const int order = order_;
   const Float4 gain = Splat4(gain_);
 
@@ -148,44 +160,54 @@ void AlignedGammaSmoother::SmoothInPlace(float* data, int length) {
 
   // Free responses: the true state entering segment q is the previous
   // segment's zero-state end plus the free response of its own entry state.
-  const float* c = coefficients_.data();
-  const int t = table_length_;
+  // c_m(segment), the free response across a whole segment.
+  float across[kMaxOrder];
+  {
+    FreeResponse response(pole_, order);
+    for (int n = 1; n < segment; ++n) response.Skip();
+    response.Next(across, 1);
+  }
+  float c[kMaxOrder * kChunk];  // c_m(n) for a chunk of n, row m at m * kChunk
   float entry[kMaxOrder] = {};  // the true state entering segment q
   for (int q = 1; q < kLanes; ++q) {
     const int start = q * segment;
     if (start >= total) break;
-    const int previous = segment;  // segments before the last are full
     float next[kMaxOrder];
     for (int k = 0; k < order; ++k) {
       float free = 0.0f;
       if (q > 1) {
-        for (int m = 0; m <= k; ++m) free += c[m * t + previous - 1] * entry[k - m];
+        for (int m = 0; m <= k; ++m) free += across[m] * entry[k - m];
       }
       next[k] = final_state[q - 1][k] + free;
     }
     std::copy(next, next + order, entry);
-    // Output j = start + n - 1 gets sum_m c_m(n) entry[order - 1 - m].
+    // Output j = start + n - 1 gets sum_m c_m(n) entry[order - 1 - m], in
+    // chunks of n that start at multiples of kChunk.
     const int end = std::min(total, start + segment);
     int j = std::max(start, d);
-    for (; j < end && (j - start) % 4 != 0; ++j) {
-      const int n = j - start + 1;
-      float free = 0.0f;
-      for (int m = 0; m < order; ++m) free += c[m * t + n - 1] * entry[order - 1 - m];
-      full[j] += free;
-    }
-    for (; j + 4 <= end; j += 4) {
-      const int n = j - start + 1;
-      Float4 free = Splat4(0.0f);
-      for (int m = 0; m < order; ++m) {
-        free += Load4(c + m * t + n - 1) * Splat4(entry[order - 1 - m]);
+    FreeResponse response(pole_, order);
+    for (int n = 1; n <= j - start; ++n) response.Skip();
+    while (j < end) {
+      const int first = j;
+      const int chunk_end = std::min(end, start + ((j - start) / kChunk + 1) * kChunk);
+      for (int i = first; i < chunk_end; ++i) response.Next(c + (i - first), kChunk);
+      for (; j < chunk_end && (j - start) % 4 != 0; ++j) {
+        float free = 0.0f;
+        for (int m = 0; m < order; ++m) free += c[m * kChunk + j - first] * entry[order - 1 - m];
+        full[j] += free;
       }
-      Store4(&full[j], Load4(&full[j]) + free);
-    }
-    for (; j < end; ++j) {
-      const int n = j - start + 1;
-      float free = 0.0f;
-      for (int m = 0; m < order; ++m) free += c[m * t + n - 1] * entry[order - 1 - m];
-      full[j] += free;
+      for (; j + 4 <= chunk_end; j += 4) {
+        Float4 free = Splat4(0.0f);
+        for (int m = 0; m < order; ++m) {
+          free += Load4(c + m * kChunk + j - first) * Splat4(entry[order - 1 - m]);
+        }
+        Store4(&full[j], Load4(&full[j]) + free);
+      }
+      for (; j < chunk_end; ++j) {
+        float free = 0.0f;
+        for (int m = 0; m < order; ++m) free += c[m * kChunk + j - first] * entry[order - 1 - m];
+        full[j] += free;
+      }
     }
   }
   std::copy(full + d, full + total, data);

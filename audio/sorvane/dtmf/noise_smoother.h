@@ -6,14 +6,14 @@
 // Smooth (the fast path) runs the recursion on eight segments of the
 // sequence at once, each from a zero state (the first from the primed
 // one), in the lanes of two Float4 vectors, then adds to every segment the
-// free response of the true state it starts from, from tables of the
+// free response of the true state it starts from, generated from the
 // closed form p^n C(n + m - 1, m) (1 - p)^m. SmoothReference is the direct
 // serial form. They agree within float rounding: |fast - reference| <=
 // 1e-5 * max |x| (see noise_smoother_test.cc). Both are pure functions of
 // the input, so equal inputs give bit-identical outputs on either path.
 //
-// Not thread safe (scratch tables); allocation-free once the tables cover
-// the longest input seen.
+// Not thread safe (Smooth's scratch). SmoothInPlace never allocates; Smooth
+// does only when an input is longer than any before.
 #ifndef AUDIO_SORVANE_DTMF_NOISE_SMOOTHER_H_
 #define AUDIO_SORVANE_DTMF_NOISE_SMOOTHER_H_
 
@@ -43,17 +43,13 @@ class AlignedGammaSmoother {
  private:
   static constexpr int kLanes = 8;
   static constexpr int kMaxOrder = 8;
-  void EnsureTables(int length);
+  static constexpr int kChunk = 128;  // free-response values generated at a time
 
   int order_;
   double sample_rate_;
   double pole_;
   float gain_;
   int delay_;
-  // coefficients_[m * table_length_ + n - 1] = p^n C(n + m - 1, m) g^m for
-  // n = 1 .. table_length_.
-  std::vector<float> coefficients_;
-  int table_length_ = 0;
   std::vector<float> input_;  // scratch of Smooth
 };
 
