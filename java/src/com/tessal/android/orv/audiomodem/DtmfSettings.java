@@ -35,6 +35,7 @@ public final class DtmfSettings {
   private final float sampleRate;
   private final float windowDuration;
   private final float[] adsr;
+  private final boolean windowSet;  // adsr given, rather than scaled from the frame
   private final int maxCandidatesPerDecodeTokenCall;
 
   private DtmfSettings(Builder b, float[] adsr) {
@@ -46,6 +47,7 @@ public final class DtmfSettings {
     sampleRate = b.sampleRate;
     windowDuration = b.windowDuration;
     this.adsr = adsr;
+    windowSet = b.adsr != null;
     maxCandidatesPerDecodeTokenCall = b.maxCandidatesPerDecodeTokenCall;
   }
 
@@ -58,7 +60,7 @@ public final class DtmfSettings {
     return new Builder();
   }
 
-  /** A builder holding these settings (the window as an explicit envelope). */
+  /** A builder holding these settings. */
   public Builder toBuilder() {
     Builder b = new Builder();
     b.bytesInToken = bytesInToken;
@@ -68,7 +70,7 @@ public final class DtmfSettings {
     b.toneFrequencies = toneFrequencies.clone();
     b.sampleRate = sampleRate;
     b.windowDuration = windowDuration;
-    b.adsr = adsr.clone();
+    b.adsr = windowSet ? adsr.clone() : null;
     b.maxCandidatesPerDecodeTokenCall = maxCandidatesPerDecodeTokenCall;
     return b;
   }
