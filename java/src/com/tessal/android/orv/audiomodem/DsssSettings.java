@@ -1,0 +1,184 @@
+package com.tessal.android.orv.audiomodem;
+
+/**
+ * Settings of the DSSS scheme: 18.5 kHz carrier, a 127-chip spreading code,
+ * 4 bits per symbol and 8-byte tokens by default (the library's and the
+ * {@code sorvel} tool's defaults). Sender and receiver must use the same
+ * settings, except those marked as one side's only.
+ *
+ * <p>Immutable and thread safe. {@link Builder#build()} checks every value
+ * against the limits the native modem enforces (plus the sample-rate, token
+ * and upsampling ranges this API allows) and throws {@link
+ * IllegalArgumentException} naming the setting and its range, so settings
+ * that reach the library never end the process.
+ */
+public final class DsssSettings {
+  /** Spreading codes per register length: three for 5 and 6 taps, else four. */
+  static int codesForTaps(int numberOfTaps) {
+    return numberOfTaps <= 6 ? 3 : 4;
+  }
+
+  /** Upsampling factors this API allows; larger ones cost megabytes per frame. */
+  static final int MAX_UPSAMPLING_FACTOR = 32;
+  /** Keeps the native tone arithmetic (min cycles + symbol) inside an int. */
+  static final int MAX_MIN_CYCLES_PER_FRAME = Integer.MAX_VALUE - 256;
+
+  private final int tokenLengthBytes;
+  private final boolean appendCheckSymbol;
+  private final int numberOfTaps;
+  private final int codeNumber;
+  private final int upsamplingFactor;
+  private final int bitsPerSymbol;
+  private final int minCyclesPerFrame;
+  private final int basebandDecimationFactor;
+  private final boolean useQuadrature;
+  private final float sampleRate;
+  private final float desiredCarrierFrequency;
+  private final int maxCandidatesToReturn;
+  private final boolean highPassAtCarrier;
+  private final int broadcastSampleRate;
+  private final float startTransitionDuration;
+
+  private DsssSettings(Builder b) {
+    tokenLengthBytes = b.tokenLengthBytes;
+    appendCheckSymbol = b.appendCheckSymbol;
+    numberOfTaps = b.numberOfTaps;
+    codeNumber = b.codeNumber;
+    upsamplingFactor = b.upsamplingFactor;
+    bitsPerSymbol = b.bitsPerSymbol;
+    minCyclesPerFrame = b.minCyclesPerFrame;
+    basebandDecimationFactor = b.basebandDecimationFactor;
+    useQuadrature = b.useQuadrature;
+    sampleRate = b.sampleRate;
+    desiredCarrierFrequency = b.desiredCarrierFrequency;
+    maxCandidatesToReturn = b.maxCandidatesToReturn;
+    highPassAtCarrier = b.highPassAtCarrier;
+    broadcastSampleRate = b.broadcastSampleRate;
+    startTransitionDuration = b.startTransitionDuration;
+  }
+
+  /** The defaults. */
+  public static DsssSettings defaults() {
+    return new Builder().build();
+  }
+
+  public static Builder builder() {
+    return new Builder();
+  }
+
+  /** A builder holding these settings. */
+  public Builder toBuilder() {
+    Builder b = new Builder();
+    b.tokenLengthBytes = tokenLengthBytes;
+    b.appendCheckSymbol = appendCheckSymbol;
+    b.numberOfTaps = numberOfTaps;
+    b.codeNumber = codeNumber;
+    b.upsamplingFactor = upsamplingFactor;
+    b.bitsPerSymbol = bitsPerSymbol;
+    b.minCyclesPerFrame = minCyclesPerFrame;
+    b.basebandDecimationFactor = basebandDecimationFactor;
+    b.useQuadrature = useQuadrature;
+    b.sampleRate = sampleRate;
+    b.desiredCarrierFrequency = desiredCarrierFrequency;
+    b.maxCandidatesToReturn = maxCandidatesToReturn;
+    b.highPassAtCarrier = highPassAtCarrier;
+    b.broadcastSampleRate = broadcastSampleRate;
+    b.startTransitionDuration = startTransitionDuration;
+    return b;
+  }
+
+  public int tokenLengthBytes() { return tokenLengthBytes; }
+  public boolean appendCheckSymbol() { return appendCheckSymbol; }
+  public int numberOfTaps() { return numberOfTaps; }
+  public int codeNumber() { return codeNumber; }
+  public int upsamplingFactor() { return upsamplingFactor; }
+  public int bitsPerSymbol() { return bitsPerSymbol; }
+  public int minCyclesPerFrame() { return minCyclesPerFrame; }
+  public int basebandDecimationFactor() { return basebandDecimationFactor; }
+  public boolean useQuadrature() { return useQuadrature; }
+  public float sampleRate() { return sampleRate; }
+  public float desiredCarrierFrequency() { return desiredCarrierFrequency; }
+  public int maxCandidatesToReturn() { return maxCandidatesToReturn; }
+  public boolean highPassAtCarrier() { return highPassAtCarrier; }
+  public int broadcastSampleRate() { return broadcastSampleRate; }
+  public float startTransitionDuration() { return startTransitionDuration; }
+
+  /** Collects settings; not thread safe. Setters only store, build() checks. */
+  public static final class Builder {
+    private int tokenLengthBytes = 8;
+    private boolean appendCheckSymbol = false;
+    private int numberOfTaps = 7;
+    private int codeNumber = 0;
+    private int upsamplingFactor = 15;
+    private int bitsPerSymbol = 4;
+    private int minCyclesPerFrame = 4;
+    private int basebandDecimationFactor = 3;
+    private boolean useQuadrature = false;
+    private float sampleRate = 44100f;
+    private float desiredCarrierFrequency = 18500f;
+    private int maxCandidatesToReturn = 2;
+    private boolean highPassAtCarrier = false;
+    private int broadcastSampleRate = 44100;
+    private float startTransitionDuration = 0.005f;
+
+    private Builder() {}
+
+    /** Bytes per token, CRC bytes included: 1 to 64 (3 or more with CRC). */
+    public Builder tokenLengthBytes(int v) { tokenLengthBytes = v; return this; }
+    /** Tokens carry a check symbol after the data symbols. */
+    public Builder appendCheckSymbol(boolean v) { appendCheckSymbol = v; return this; }
+    /** Spreading code register length, 5 to 11 (code of 2^taps - 1 chips). */
+    public Builder numberOfTaps(int v) { numberOfTaps = v; return this; }
+    /** Code of that length: 0 to 2 for 5 and 6 taps, else 0 to 3. */
+    public Builder codeNumber(int v) { codeNumber = v; return this; }
+    /** Samples per chip, 1 to 32. */
+    public Builder upsamplingFactor(int v) { upsamplingFactor = v; return this; }
+    /** 1, 2, 4 or 8. */
+    public Builder bitsPerSymbol(int v) { bitsPerSymbol = v; return this; }
+    /** Tone cycles per frame of symbol 0, 0 or more. */
+    public Builder minCyclesPerFrame(int v) { minCyclesPerFrame = v; return this; }
+    /** Receiver's baseband decimation; must divide the upsampling factor. */
+    public Builder basebandDecimationFactor(int v) { basebandDecimationFactor = v; return this; }
+    /** The symbol tone rides on the cosine carrier. */
+    public Builder useQuadrature(boolean v) { useQuadrature = v; return this; }
+    /** Rate the frames are built at, 8000 to 192000 Hz. */
+    public Builder sampleRate(float hz) { sampleRate = hz; return this; }
+    /** Carrier asked for, 0 to sampleRate / 2 Hz (rounded down to whole cycles per frame). */
+    public Builder desiredCarrierFrequency(float hz) { desiredCarrierFrequency = hz; return this; }
+    /** Receiver only: tokens one request returns at most, 1 to 6. */
+    public Builder maxCandidatesToReturn(int v) { maxCandidatesToReturn = v; return this; }
+    /** Sender only: remove everything below the carrier. */
+    public Builder highPassAtCarrier(boolean v) { highPassAtCarrier = v; return this; }
+    /** Sender only: output rate, 8000 to 192000 Hz. */
+    public Builder broadcastSampleRate(int hz) { broadcastSampleRate = hz; return this; }
+    /** Sender only: fade-in before the loop, 0 to 1 s. */
+    public Builder startTransitionDuration(float s) { startTransitionDuration = s; return this; }
+
+    /** Checks every value (in the order the library does) and builds the settings. */
+    public DsssSettings build() {
+      Checks.intIn("tokenLengthBytes", tokenLengthBytes, 1, Checks.MAX_TOKEN_BYTES);
+      Checks.intIn("numberOfTaps", numberOfTaps, 5, 11);
+      int codes = codesForTaps(numberOfTaps);
+      if (codeNumber < 0 || codeNumber >= codes) {
+        throw Checks.fail("codeNumber must be in [0, " + (codes - 1) + "] for " + numberOfTaps
+            + " taps, got " + codeNumber);
+      }
+      if (bitsPerSymbol != 1 && bitsPerSymbol != 2 && bitsPerSymbol != 4 && bitsPerSymbol != 8) {
+        throw Checks.fail("bitsPerSymbol must be 1, 2, 4 or 8, got " + bitsPerSymbol);
+      }
+      Checks.rate("sampleRate", sampleRate);
+      Checks.intIn("upsamplingFactor", upsamplingFactor, 1, MAX_UPSAMPLING_FACTOR);
+      if (basebandDecimationFactor <= 0 || upsamplingFactor % basebandDecimationFactor != 0) {
+        throw Checks.fail("basebandDecimationFactor must be positive and divide upsamplingFactor ("
+            + upsamplingFactor + "), got " + basebandDecimationFactor);
+      }
+      // Float arithmetic, as the coder compares it.
+      Checks.floatIn("desiredCarrierFrequency", desiredCarrierFrequency, 0f, sampleRate / 2);
+      Checks.intIn("minCyclesPerFrame", minCyclesPerFrame, 0, MAX_MIN_CYCLES_PER_FRAME);
+      Checks.intIn("maxCandidatesToReturn", maxCandidatesToReturn, 1, Checks.MAX_CANDIDATES);
+      Checks.rate("broadcastSampleRate", broadcastSampleRate);
+      Checks.floatIn("startTransitionDuration", startTransitionDuration, 0f, 1f);
+      return new DsssSettings(this);
+    }
+  }
+}
