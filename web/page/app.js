@@ -163,7 +163,7 @@ function addToken(hex) {
   $('tokens').prepend(item);
 }
 
-// Mean power of the analyser's bins in the band, in dB (full scale).
+// Power in the band (the sum over the analyser's bins), in dB full scale.
 function bandLevelDb(analyser, spectrum) {
   analyser.getFloatFrequencyData(spectrum);
   const binHz = context.sampleRate / analyser.fftSize;
@@ -171,7 +171,7 @@ function bandLevelDb(analyser, spectrum) {
   const last = Math.min(spectrum.length - 1, Math.floor(BAND_HIGH_HZ / binHz));
   let power = 0;
   for (let k = first; k <= last; ++k) power += 10 ** (spectrum[k] / 10);
-  const db = 10 * Math.log10(power / Math.max(1, last - first + 1));
+  const db = 10 * Math.log10(power);
   return Math.max(METER_FLOOR_DB, Number.isFinite(db) ? db : METER_FLOOR_DB);
 }
 
