@@ -137,5 +137,19 @@ TEST(WebDecoderTest, MisuseKeepsTheDecoderWorking) {
   EXPECT_THAT(Listen(decoder, broadcast.samples), ElementsAre("536f7276656c"));
 }
 
+// Verifies that the decoder behind the wake-up detector, whose timeout runs
+// on the audio fed rather than the wall clock, decodes a broadcast.
+TEST(WebDecoderTest, DecodesBehindTheWakeUpDetector) {
+  WebModemSettings s = Settings("dsss", true, 48000);
+  const EncodeResult broadcast = EncodeToken(s, "536f7276656c", 4.0);
+  ASSERT_EQ(broadcast.error, "");
+  s.hotsound = true;
+  WebDecoder decoder;
+  ASSERT_EQ(decoder.Configure(s), "");
+  std::vector<float> audio(48000, 0.0f);  // a second of silence first
+  audio.insert(audio.end(), broadcast.samples.begin(), broadcast.samples.end());
+  EXPECT_THAT(Listen(decoder, audio), ElementsAre("536f7276656c"));
+}
+
 }  // namespace
 }  // namespace sorvel_web

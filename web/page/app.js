@@ -15,12 +15,17 @@ let context = null;   // one AudioContext for playing and listening
 let player = null;    // the AudioBufferSourceNode playing, if any
 let listening = null; // {stream, source, worklet, analyser, decoder}
 
+// The sender's settings; the receiver adds the wake-up gate.
 function settings() {
   return {
     scheme: $('scheme').value,
     crc: $('crc').checked,
     sampleRateHz: context ? context.sampleRate : 48000,
   };
+}
+
+function receiverSettings() {
+  return {...settings(), hotsound: $('hotsound').checked};
 }
 
 function showError(id, message) {
@@ -93,12 +98,13 @@ function stopPlaying() {
 // keeps the decoder that was listening.
 function configureDecoder() {
   if (!listening) return;
-  const error = listening.decoder.configure(settings());
+  const s = receiverSettings();
+  const error = listening.decoder.configure(s);
   showError('listen-error', error);
   if (!error) {
-    const s = settings();
     $('listen-info').textContent =
-        `Listening at ${s.sampleRateHz} Hz for ${s.scheme}${s.crc ? ' with CRC' : ''}.`;
+        `Listening at ${s.sampleRateHz} Hz for ${s.scheme}${s.crc ? ' with CRC' : ''}` +
+        `${s.hotsound ? ' after the wake-up detector' : ''}.`;
   }
 }
 
@@ -224,6 +230,7 @@ createSorvelModule().then((module) => {
   $('stop-listen').addEventListener('click', stopListening);
   $('scheme').addEventListener('change', onSettingsChanged);
   $('crc').addEventListener('change', onSettingsChanged);
+  $('hotsound').addEventListener('change', configureDecoder);
   $('play').disabled = false;
   $('start-listen').disabled = false;
   updateHint();

@@ -92,7 +92,7 @@ after(async () => {
 const text = (selector) => page.$eval(selector, (e) => e.textContent);
 const visible = (selector) => page.$eval(selector, (e) => !e.hidden);
 
-test('the page decodes the token its microphone hears', {timeout: DECODE_TIMEOUT_MS + 10000}, async () => {
+test('the page decodes the token its microphone hears', {timeout: 2 * DECODE_TIMEOUT_MS + 10000}, async () => {
   await page.click('#start-listen');
   await page.waitForFunction(
       (message) => [...document.querySelectorAll('#tokens code')].some((c) => c.textContent === message),
@@ -101,6 +101,15 @@ test('the page decodes the token its microphone hears', {timeout: DECODE_TIMEOUT
   assert.equal(await visible('#listen-error'), false);
   // The meter has drawn a level for the band the broadcast fills.
   assert.match(await text('#level-db'), /-?\d+\.\d dBFS/);
+
+  // Behind the wake-up detector: a rebuilt decoder reports the token again.
+  await page.click('#hotsound');
+  assert.match(await text('#listen-info'), /after the wake-up detector/);
+  await page.waitForFunction(
+      (message) => [...document.querySelectorAll('#tokens code')]
+                       .filter((c) => c.textContent === message).length === 2,
+      {timeout: DECODE_TIMEOUT_MS}, MESSAGE);
+  await page.click('#hotsound');
   await page.screenshot({path: path.join(out, 'web-page.png'), fullPage: true});
 });
 
@@ -133,7 +142,13 @@ test('bad settings show a message and leave the page working', async () => {
   assert.equal(await visible('#send-error'), false);
   assert.match(await text('#send-info'), /Playing \d+\.\d\d s at \d+ Hz/);
   // The decoder followed the scheme change and still listens.
-  assert.match(await text('#listen-info'), /for dtmf with CRC/);
+  assert.match(await text('#listen-info'), /for dtmf with CRC\./);
+  // A receiver setting the decoder refuses: it keeps listening as it was.
+  await page.click('#hotsound');
+  assert.match(await text('#listen-error'), /the wake-up detector works with the dsss scheme/);
+  assert.match(await text('#listen-info'), /for dtmf with CRC\./);
+  await page.click('#hotsound');
+  assert.equal(await visible('#listen-error'), false);
   assert.deepEqual(pageErrors, []);
   assert.deepEqual(foreignRequests, []);
 });
