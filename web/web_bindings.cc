@@ -13,6 +13,7 @@
 #include <emscripten/bind.h>
 #include <emscripten/val.h>
 
+#include <cmath>
 #include <string>
 #include <vector>
 
@@ -25,13 +26,16 @@ namespace {
 
 using emscripten::val;
 
+bool IsNumber(const val& v) { return v.typeOf().as<std::string>() == "number"; }
+bool IsString(const val& v) { return v.typeOf().as<std::string>() == "string"; }
+
 // Reads the settings object field by field; "" or the first bad field.
 std::string ReadSettings(const val& object, WebModemSettings* settings) {
   if (object.isUndefined() || object.isNull()) return "";
   if (object.typeOf().as<std::string>() != "object") return "settings must be an object";
   const val scheme = object["scheme"];
   if (!scheme.isUndefined()) {
-    if (scheme.typeOf().as<std::string>() != "string") return "scheme must be a string";
+    if (!IsString(scheme)) return "scheme must be a string";
     settings->scheme = scheme.as<std::string>();
   }
   const val crc = object["crc"];
@@ -40,18 +44,28 @@ std::string ReadSettings(const val& object, WebModemSettings* settings) {
   if (!hotsound.isUndefined()) settings->hotsound = hotsound.as<bool>();
   const val rate = object["sampleRateHz"];
   if (!rate.isUndefined()) {
-    const double hz = rate.as<double>();
-    if (!(hz == static_cast<int>(hz))) return "sampleRateHz must be a whole number";
+    // Range first: converting a larger double to int is undefined.
+    const double hz = IsNumber(rate) ? rate.as<double>() : 0.0;
+    if (!(hz >= kMinSampleRateHz && hz <= kMaxSampleRateHz) || hz != std::floor(hz)) {
+      return "sampleRateHz must be a whole number in [" + std::to_string(kMinSampleRateHz) +
+             ", " + std::to_string(kMaxSampleRateHz) + "]";
+    }
     settings->sample_rate_hz = static_cast<int>(hz);
   }
   return "";
 }
 
-val Encode(const val& settings_object, const std::string& hex, double loop_seconds) {
+val Encode(const val& settings_object, const val& hex, const val& loop_seconds) {
   WebModemSettings settings;
   EncodeResult encoded;
   encoded.error = ReadSettings(settings_object, &settings);
-  if (encoded.error.empty()) encoded = EncodeToken(settings, hex, loop_seconds);
+  if (encoded.error.empty() && !IsString(hex)) encoded.error = "the token must be a string";
+  if (encoded.error.empty() && !IsNumber(loop_seconds)) {
+    encoded.error = "the loop must be a number of seconds";
+  }
+  if (encoded.error.empty()) {
+    encoded = EncodeToken(settings, hex.as<std::string>(), loop_seconds.as<double>());
+  }
   val result = val::object();
   result.set("error", encoded.error);
   result.set("sampleRateHz", settings.sample_rate_hz);

@@ -152,3 +152,32 @@ test('bad settings show a message and leave the page working', async () => {
   assert.deepEqual(pageErrors, []);
   assert.deepEqual(foreignRequests, []);
 });
+
+test('the module answers bad arguments with messages, not exceptions', async () => {
+  const answers = await page.evaluate((message) => {
+    const decoder = new modem.Decoder();
+    const result = {
+      hugeRate: modem.encode({sampleRateHz: 1e20}, message, 0).error,
+      oddRate: modem.encode({sampleRateHz: 44100.5}, message, 0).error,
+      schemeType: modem.encode({scheme: 7}, message, 0).error,
+      tokenType: modem.encode({crc: true}, 42, 0).error,
+      loopType: modem.encode({crc: true}, message, 'x').error,
+      good: modem.encode({crc: true, sampleRateHz: 48000}, message, 0).pcm16.length,
+      unconfigured: decoder.process(new Float32Array(4096)).length,
+      lowRate: decoder.configure({sampleRateHz: 22050}),
+      notFloats: decoder.process([1, 2, 3]).length,
+    };
+    decoder.delete();
+    return result;
+  }, MESSAGE);
+  assert.match(answers.hugeRate, /sampleRateHz must be a whole number in \[8000, 192000\]/);
+  assert.match(answers.oddRate, /sampleRateHz must be a whole number/);
+  assert.match(answers.schemeType, /scheme must be a string/);
+  assert.match(answers.tokenType, /token must be a string/);
+  assert.match(answers.loopType, /loop must be a number of seconds/);
+  assert.ok(answers.good > 0);
+  assert.equal(answers.unconfigured, 0);
+  assert.match(answers.lowRate, /22050 Hz rate cannot carry the 18500 Hz carrier/);
+  assert.equal(answers.notFloats, 0);
+  assert.deepEqual(pageErrors, []);
+});
