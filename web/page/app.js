@@ -13,7 +13,7 @@ const METER_FLOOR_DB = -120;
 let modem = null;     // the WebAssembly module
 let context = null;   // one AudioContext for playing and listening
 let player = null;    // the AudioBufferSourceNode playing, if any
-let listening = null; // {stream, source, worklet, analyser, decoder}
+let listening = null; // {stream, source, worklet, analyser, decoder, settings}
 
 // The sender's settings; the receiver adds the wake-up gate.
 function settings() {
@@ -102,6 +102,7 @@ function configureDecoder() {
   const error = listening.decoder.configure(s);
   showError('listen-error', error);
   if (!error) {
+    listening.settings = s;
     $('listen-info').textContent =
         `Listening at ${s.sampleRateHz} Hz for ${s.scheme}${s.crc ? ' with CRC' : ''}` +
         `${s.hotsound ? ' after the wake-up detector' : ''}.`;
@@ -162,9 +163,11 @@ function addToken(hex) {
   time.textContent = new Date().toLocaleTimeString();
   const code = document.createElement('code');
   code.textContent = hex;
-  const s = settings();
+  // The settings of the decoder that heard it.
+  const s = listening.settings;
   const scheme = document.createElement('span');
-  scheme.textContent = `${s.scheme}${s.crc ? ', CRC passed' : ''}`;
+  scheme.textContent =
+      `${s.scheme}${s.crc ? ', CRC passed' : ''}${s.hotsound ? ', after wake-up' : ''}`;
   item.append(time, ' ', code, ' ', scheme);
   $('tokens').prepend(item);
 }

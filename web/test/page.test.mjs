@@ -109,6 +109,7 @@ test('the page decodes the token its microphone hears', {timeout: 2 * DECODE_TIM
       (message) => [...document.querySelectorAll('#tokens code')]
                        .filter((c) => c.textContent === message).length === 2,
       {timeout: DECODE_TIMEOUT_MS}, MESSAGE);
+  assert.match(await text('#tokens li:first-child'), /dsss, CRC passed, after wake-up/);
   await page.click('#hotsound');
   await page.screenshot({path: path.join(out, 'web-page.png'), fullPage: true});
 });
