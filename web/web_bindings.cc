@@ -65,6 +65,8 @@ val Encode(const val& settings_object, const val& hex, const val& loop_seconds) 
   }
   if (encoded.error.empty()) {
     encoded = EncodeToken(settings, hex.as<std::string>(), loop_seconds.as<double>());
+  } else {
+    LOG(ERROR) << encoded.error;
   }
   val result = val::object();
   result.set("error", encoded.error);
@@ -94,7 +96,10 @@ class JsDecoder {
  public:
   std::string Configure(const val& settings_object) {
     WebModemSettings settings;
-    if (std::string e = ReadSettings(settings_object, &settings); !e.empty()) return e;
+    if (std::string e = ReadSettings(settings_object, &settings); !e.empty()) {
+      LOG(ERROR) << e;
+      return e;
+    }
     return decoder_.Configure(settings);
   }
 
