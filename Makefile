@@ -117,3 +117,18 @@ fuzz-long: fuzz-long-build
 
 clean:
 	@rm -rf $(BUILD_DIR) build-sanitize build-arm64 build-fuzz build-fuzz-long out
+
+# The browser page, built with emscripten into $(WEB_BUILD_DIR)/dist, and its
+# test: headless Chromium whose fake microphone plays a broadcast that the
+# host `sorvel` wrote (screenshots in out/).
+WEB_BUILD_DIR ?= build-web
+.PHONY: web web-test
+web:
+	@bash tools/install-deps.sh --web
+	@bash web/build.sh $(WEB_BUILD_DIR) $(JOBS)
+
+web-test: web configure
+	@cmake --build $(BUILD_DIR) -j $(JOBS) --target sorvel
+	@cd web && npm ci --no-audit --no-fund --loglevel=error
+	@SORVEL_WEB_DIST=$(CURDIR)/$(WEB_BUILD_DIR)/dist SORVEL_BIN=$(CURDIR)/$(BUILD_DIR)/tools/sorvel \
+	  SORVEL_OUT=$(CURDIR)/out node --test web/test/page.test.mjs

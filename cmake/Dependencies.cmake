@@ -30,6 +30,23 @@ if(ANDROID)
   target_include_directories(sorvel_eigen SYSTEM INTERFACE ${eigen_SOURCE_DIR})
   add_library(Eigen3::Eigen ALIAS sorvel_eigen)
   find_library(SORVEL_ANDROID_LOG_LIBRARY log REQUIRED)
+elseif(EMSCRIPTEN)
+  # The browser build: KISS FFT compiled from Debian's source package (the
+  # Makefile's web target unpacks it and passes its directory), Eigen from
+  # Debian's headers.
+  set(SORVEL_KISSFFT_SOURCE_DIR "" CACHE PATH "Unpacked KISS FFT sources")
+  if(NOT EXISTS "${SORVEL_KISSFFT_SOURCE_DIR}/kiss_fftr.c")
+    message(FATAL_ERROR "SORVEL_KISSFFT_SOURCE_DIR must name KISS FFT's sources")
+  endif()
+  add_library(sorvel_kissfft STATIC ${SORVEL_KISSFFT_SOURCE_DIR}/kiss_fft.c
+                                    ${SORVEL_KISSFFT_SOURCE_DIR}/kiss_fftr.c)
+  target_include_directories(sorvel_kissfft SYSTEM PUBLIC ${SORVEL_KISSFFT_SOURCE_DIR})
+  target_compile_definitions(sorvel_kissfft PUBLIC kiss_fft_scalar=float)
+  target_compile_options(sorvel_kissfft PRIVATE -w)
+  add_library(kissfft::kissfft ALIAS sorvel_kissfft)
+  add_library(sorvel_eigen INTERFACE)
+  target_include_directories(sorvel_eigen SYSTEM INTERFACE /usr/include/eigen3)
+  add_library(Eigen3::Eigen ALIAS sorvel_eigen)
 else()
   find_package(kissfft CONFIG REQUIRED COMPONENTS SHARED float)
   find_package(Eigen3 3.4 CONFIG REQUIRED)

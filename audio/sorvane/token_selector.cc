@@ -1,7 +1,7 @@
 #include "audio/sorvane/token_selector.h"
 
 #include <algorithm>
-#include <bit>
+#include <cstring>
 #include <tuple>
 
 #include "audio/dsp/batch_top_n.h"
@@ -135,7 +135,11 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
     std::vector<uint64_t>& keys = s.runner_up_keys;
     keys.clear();
     for (const auto& [value, r, c] : runners_up) {
-      keys.push_back(uint64_t{std::bit_cast<uint32_t>(value)} << 32 |
+      // memcpy rather than std::bit_cast, which the browser build's libc++
+      // lacks.
+      uint32_t bits;
+      std::memcpy(&bits, &value, sizeof(bits));
+      keys.push_back(uint64_t{bits} << 32 |
                      static_cast<uint64_t>(r) << 16 | static_cast<uint64_t>(c));
     }
     std::sort(keys.begin(), keys.end());
