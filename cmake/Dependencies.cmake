@@ -1,24 +1,25 @@
-# Third-party libraries of the modem. On the host they come from Debian
-# packages (tools/install-deps.sh); Android has no such packages, so pinned
-# releases are fetched there instead. The Android branch cannot be exercised
-# on the development machines (no NDK, no network beyond Debian); add a
-# URL_HASH for each archive when it is first built for real.
+# Third-party libraries of the modem. KISS FFT is compiled from the copy in
+# third_party/kissfft on every target, so libSorvel.so is linked the same
+# way everywhere (its objects go into sorvel_core; the JNI library hides
+# them). Eigen comes from Debian's package on the host and in the browser
+# build; Android has no such packages, so a pinned release is fetched there.
+# The Android branch cannot be exercised on the development machines (no
+# NDK, no network beyond Debian); add a URL_HASH when it is first built for
+# real.
+
+add_library(sorvel_kissfft OBJECT ${PROJECT_SOURCE_DIR}/third_party/kissfft/kiss_fft.c
+                                  ${PROJECT_SOURCE_DIR}/third_party/kissfft/kiss_fftr.c)
+target_include_directories(sorvel_kissfft SYSTEM PUBLIC
+                           $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/third_party/kissfft>)
+target_compile_definitions(sorvel_kissfft PUBLIC kiss_fft_scalar=float)
+# KISS FFT's own flags (as Debian builds it): results bit-identical to the
+# library the modem was developed against. -ffast-math here changes only
+# this code's arithmetic; it is not passed to any link.
+target_compile_options(sorvel_kissfft PRIVATE -w ${SORVEL_DSP_OPTIONS} -ffast-math
+                       -fomit-frame-pointer)
 
 if(ANDROID)
   include(FetchContent)
-  # KISS FFT, float, static, without its tests and tools.
-  set(KISSFFT_DATATYPE float CACHE STRING "" FORCE)
-  set(KISSFFT_STATIC ON CACHE BOOL "" FORCE)
-  set(KISSFFT_TEST OFF CACHE BOOL "" FORCE)
-  set(KISSFFT_TOOLS OFF CACHE BOOL "" FORCE)
-  set(KISSFFT_PKGCONFIG OFF CACHE BOOL "" FORCE)
-  set(KISSFFT_OPENMP OFF CACHE BOOL "" FORCE)
-  FetchContent_Declare(kissfft
-    URL https://github.com/mborgerding/kissfft/archive/refs/tags/131.1.0.tar.gz)
-  FetchContent_MakeAvailable(kissfft)
-  if(NOT TARGET kissfft::kissfft)
-    add_library(kissfft::kissfft ALIAS kissfft)
-  endif()
   # Eigen is header-only: unpack it and point an interface target at it.
   FetchContent_Declare(eigen
     URL https://gitlab.com/libeigen/eigen/-/archive/3.4.0/eigen-3.4.0.tar.gz)
@@ -31,24 +32,11 @@ if(ANDROID)
   add_library(Eigen3::Eigen ALIAS sorvel_eigen)
   find_library(SORVEL_ANDROID_LOG_LIBRARY log REQUIRED)
 elseif(EMSCRIPTEN)
-  # The browser build: KISS FFT compiled from Debian's source package (the
-  # Makefile's web target unpacks it and passes its directory), Eigen from
-  # Debian's headers.
-  set(SORVEL_KISSFFT_SOURCE_DIR "" CACHE PATH "Unpacked KISS FFT sources")
-  if(NOT EXISTS "${SORVEL_KISSFFT_SOURCE_DIR}/kiss_fftr.c")
-    message(FATAL_ERROR "SORVEL_KISSFFT_SOURCE_DIR must name KISS FFT's sources")
-  endif()
-  add_library(sorvel_kissfft STATIC ${SORVEL_KISSFFT_SOURCE_DIR}/kiss_fft.c
-                                    ${SORVEL_KISSFFT_SOURCE_DIR}/kiss_fftr.c)
-  target_include_directories(sorvel_kissfft SYSTEM PUBLIC ${SORVEL_KISSFFT_SOURCE_DIR})
-  target_compile_definitions(sorvel_kissfft PUBLIC kiss_fft_scalar=float)
-  target_compile_options(sorvel_kissfft PRIVATE -w)
-  add_library(kissfft::kissfft ALIAS sorvel_kissfft)
+  # The browser build: Eigen from Debian's headers.
   add_library(sorvel_eigen INTERFACE)
   target_include_directories(sorvel_eigen SYSTEM INTERFACE /usr/include/eigen3)
   add_library(Eigen3::Eigen ALIAS sorvel_eigen)
 else()
-  find_package(kissfft CONFIG REQUIRED COMPONENTS SHARED float)
   find_package(Eigen3 3.4 CONFIG REQUIRED)
 
   # The Android log library built for the host (android-liblog-dev), to

@@ -5,7 +5,7 @@ set -euo pipefail
 
 packages=(
   cmake make g++ pkg-config
-  libkissfft-dev libeigen3-dev
+  libeigen3-dev
   libgtest-dev libgmock-dev libbenchmark-dev
   openjdk-17-jdk-headless junit4
   libsndfile1-dev libcli11-dev
@@ -15,8 +15,7 @@ packages=(
 
 # Optional groups: --fuzz (clang and its fuzzer runtime), --arm64 (the
 # cross compiler, qemu and the arm64 libraries the unit tests link), --web
-# (emscripten, Chromium for the page's test, and Debian's source archive:
-# KISS FFT is compiled to WebAssembly from its source package).
+# (emscripten, and Chromium for the page's test).
 for group in "$@"; do
   case $group in
     --fuzz) packages+=(clang libclang-rt-14-dev) ;;
@@ -24,17 +23,9 @@ for group in "$@"; do
       if ! dpkg --print-foreign-architectures | grep -qx arm64; then
         [ "$(id -u)" -ne 0 ] && sudo dpkg --add-architecture arm64 || dpkg --add-architecture arm64
       fi
-      packages+=(g++-aarch64-linux-gnu qemu-user libkissfft-dev:arm64 libgtest-dev:arm64
+      packages+=(g++-aarch64-linux-gnu qemu-user libgtest-dev:arm64
                  libgmock-dev:arm64) ;;
-    --web)
-      web_src=/etc/apt/sources.list.d/sorvel-web-src.sources
-      if [ ! -f "$web_src" ]; then
-        printf '%s\n' "Types: deb-src" "URIs: http://deb.debian.org/debian" "Suites: bookworm" \
-          "Components: main" "Signed-By: /usr/share/keyrings/debian-archive-keyring.gpg" |
-          { [ "$(id -u)" -ne 0 ] && sudo tee "$web_src" || tee "$web_src"; } >/dev/null
-        { [ "$(id -u)" -ne 0 ] && sudo apt-get update -qq || apt-get update -qq; }
-      fi
-      packages+=(emscripten chromium dpkg-dev) ;;
+    --web) packages+=(emscripten chromium) ;;
     *) echo "install-deps: unknown option $group" >&2; exit 2 ;;
   esac
 done
