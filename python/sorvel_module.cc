@@ -208,10 +208,12 @@ std::vector<uint8_t> AsMessage(const py::object& message) {
   if (!py::isinstance<py::bytes>(message) && !PyByteArray_Check(message.ptr())) {
     throw py::type_error("message must be bytes or bytearray");
   }
-  const std::string text = py::isinstance<py::bytes>(message)
-                               ? message.cast<std::string>()
-                               : py::bytes(message).cast<std::string>();
-  return {text.begin(), text.end()};
+  if (py::isinstance<py::bytes>(message)) {
+    const std::string text = message.cast<std::string>();
+    return {text.begin(), text.end()};
+  }
+  const auto* data = reinterpret_cast<const uint8_t*>(PyByteArray_AsString(message.ptr()));
+  return {data, data + PyByteArray_Size(message.ptr())};
 }
 
 // Encodes tokens to int16 audio. Not thread safe: one thread at a time per
@@ -262,7 +264,7 @@ std::vector<float> ReadSamples(const py::handle& input, int channels) {
   const bool is_int16 = dtype.is(py::dtype::of<int16_t>());
   if (!is_int16 && dtype.kind() != 'f') {
     throw py::type_error("samples must be int16, or float on the 16-bit scale; got " +
-                         std::string(py::str(dtype)));
+                         py::str(static_cast<py::handle>(dtype)).cast<std::string>());
   }
   if (array.ndim() == 2 && array.shape(1) != channels) {
     throw py::value_error("samples have " + std::to_string(array.shape(1)) +
@@ -395,10 +397,10 @@ class Decoder {
 
 // Mono audio, full scale +-1, from int16 or float on the 16-bit scale.
 std::vector<float> ReadBroadcast(const py::handle& pcm) {
-  std::vector<float> samples = ReadSamples(pcm, 1);
-  if (py::reinterpret_borrow<py::array>(pcm).ndim() != 1) {
+  if (py::isinstance<py::array>(pcm) && py::reinterpret_borrow<py::array>(pcm).ndim() != 1) {
     throw py::value_error("pcm must be 1-D (mono)");
   }
+  std::vector<float> samples = ReadSamples(pcm, 1);
   if (samples.empty()) throw py::value_error("pcm is empty");
   for (float& v : samples) v /= 32768.0f;
   return samples;

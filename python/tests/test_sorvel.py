@@ -43,8 +43,14 @@ def decode(scheme, hotsound, crc, audio, blocks=None, **settings):
 def test_round_trip(scheme, hotsound, crc, message):
     heard = broadcast(scheme, crc, message)
     assert heard.dtype == np.int16
-    tokens = decode(scheme, hotsound, crc, heard)
-    assert tokens and tokens[0] == message
+    if crc:
+        assert decode(scheme, hotsound, crc, heard) == [message]
+    else:
+        # Requests made while the first token is still arriving give
+        # candidates nothing vouches for; one request at the end, with the
+        # whole loop held, ranks the message first.
+        tokens = decode(scheme, hotsound, crc, heard, interval_ms=60000)
+        assert tokens and tokens[0] == message
 
 
 @pytest.mark.parametrize("scheme,channel", [
