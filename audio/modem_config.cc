@@ -247,6 +247,11 @@ std::string CheckReceiverSettings(const ModemSettings& modem, const ReceiverSett
   if (!(rate_hz > 0) || !std::isfinite(rate_hz) || num_channels < 1) {
     return "the input needs a positive rate and channel count";
   }
+  // The rates the decoders are fuzzed at; far outside them their
+  // resamplers cannot be built.
+  if (!(rate_hz >= 8000.0f && rate_hz <= 192000.0f)) {
+    return Concat("the input rate must be between 8000 and 192000 Hz, got ", rate_hz);
+  }
   if (!(r.detection_duration >= 0.0f && r.detection_duration <= 10.0f)) {
     return Concat("detection_duration must be in [0, 10] s, got ", r.detection_duration);
   }

@@ -157,8 +157,9 @@ struct ReceiverSettings {
 // carrier band does not fit below half the rate), or "".
 std::string CheckHotsoundRate(double rate_hz);
 
-// Why a receiver with these settings cannot take input at `rate_hz` with
-// `num_channels` interleaved channels, or "". `modem` must be resolved.
+// Why a receiver with these settings cannot take input at `rate_hz` (8 to
+// 192 kHz) with `num_channels` interleaved channels, or "". `modem` must be
+// resolved.
 std::string CheckReceiverSettings(const ModemSettings& modem, const ReceiverSettings& receiver,
                                   float rate_hz, int num_channels);
 
