@@ -55,7 +55,8 @@ soak-stream: build
 # the JVM does not start with the ASan runtime preloaded into its process.
 sanitize: deps
 	@cmake -S . -B build-sanitize -DCMAKE_BUILD_TYPE=Debug -DSORVEL_SANITIZE=ON \
-	  -DSORVEL_WERROR=ON -DSORVEL_BUILD_BENCHMARKS=OFF -DSORVEL_BUILD_JAVA=OFF >/dev/null
+	  -DSORVEL_WERROR=ON -DSORVEL_BUILD_BENCHMARKS=OFF -DSORVEL_BUILD_JAVA=OFF \
+	  -DSORVEL_BUILD_PYTHON=OFF >/dev/null
 	@cmake --build build-sanitize -j $(JOBS)
 	@cd build-sanitize && ctest --output-on-failure -j $(JOBS) -LE soak
 
@@ -65,7 +66,7 @@ arm64:
 	@bash tools/install-deps.sh --arm64
 	@cmake -S . -B build-arm64 -DCMAKE_TOOLCHAIN_FILE=cmake/aarch64-linux-gnu.cmake \
 	  -DCMAKE_BUILD_TYPE=RelWithDebInfo -DSORVEL_WERROR=ON -DSORVEL_BUILD_TOOLS=OFF \
-	  -DSORVEL_BUILD_BENCHMARKS=OFF -DSORVEL_BUILD_JAVA=OFF >/dev/null
+	  -DSORVEL_BUILD_BENCHMARKS=OFF -DSORVEL_BUILD_JAVA=OFF -DSORVEL_BUILD_PYTHON=OFF >/dev/null
 	@cmake --build build-arm64 -j $(JOBS)
 	@cd build-arm64 && ctest --output-on-failure -j $(JOBS) -E DeathTest --timeout 300
 

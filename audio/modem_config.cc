@@ -1,8 +1,11 @@
 #include "audio/modem_config.h"
 
+#include <chrono>
+#include <cmath>
 #include <sstream>
 #include <utility>
 
+#include "audio/hotsound_detector.h"
 #include "audio/sorvane/code_signal_generator.h"
 #include "audio/sorvane/token_symbol_converter.h"
 
@@ -182,6 +185,134 @@ std::unique_ptr<AudioModemDecoder> MakeDtmfDecoder(const DtmfDecoderConfig& conf
       std::make_unique<AudioModemDecoder>(std::make_unique<DtmfDecoder>(params));
   decoder->Initialize(config.num_channels, config.input_sample_rate);
   return decoder;
+}
+
+std::string ResolveModemSettings(ModemSettings& s) {
+  if (s.scheme != "dsss" && s.scheme != "dtmf") {
+    return "scheme must be dsss or dtmf, got '" + s.scheme + "'";
+  }
+  if (s.MessageBytes() <= 0) {
+    return "token bytes (" + std::to_string(s.TokenBytes()) + ") leave no message bytes";
+  }
+  if (s.is_dsss()) {
+    s.dsss.token_length_bytes = s.TokenBytes();
+    s.dsss.coder.baseband_decimation_factor = s.decimation_factor.value_or(3);
+    if (std::string e = ValidateDsssCoderConfig(s.dsss.coder); !e.empty()) return e;
+    if (s.dsss.broadcast_sample_rate <= 0) return "broadcast sample rate must be positive";
+    if (!(s.dsss.start_transition_duration >= 0.0f && s.dsss.start_transition_duration <= 1.0f)) {
+      return Concat("start_transition_duration must be in [0, 1] s, got ",
+                    s.dsss.start_transition_duration);
+    }
+    return "";
+  }
+  s.dtmf.bytes_in_token = s.TokenBytes();
+  s.dtmf.sample_rate = s.dsss.coder.sample_rate;
+  s.dtmf.baseband_decimation_factor = s.decimation_factor.value_or(16);
+  if (!s.adsr.empty()) {
+    if (s.adsr.size() != 5) {
+      return Concat("adsr takes 5 values (attack, decay, sustain, release, level), got ",
+                    s.adsr.size());
+    }
+    s.dtmf.adsr = {{s.adsr[0], s.adsr[1], s.adsr[2], s.adsr[3], s.adsr[4]}};
+  }
+  return ValidateDtmfConfig(s.dtmf);
+}
+
+std::string CheckMessageBytes(const ModemSettings& s, size_t message_bytes) {
+  if (static_cast<int>(message_bytes) == s.MessageBytes()) return "";
+  return Concat("token has ", message_bytes, " bytes; the ", s.scheme, " scheme sends ",
+                s.TokenBytes(), "-byte tokens, so give ", s.MessageBytes(),
+                s.crc ? " message bytes (the CRC adds 2)" : " bytes");
+}
+
+std::unique_ptr<AudioModemEncoder> MakeEncoder(const ModemSettings& s) {
+  return s.is_dsss() ? MakeDsssEncoder(s.dsss) : MakeDtmfEncoder(s.dtmf);
+}
+
+std::string CheckHotsoundRate(double rate_hz) {
+  const double carrier = HotsoundDetectorConfig().frequency;
+  // The detector is built for the whole-Hz rate.
+  if (HotsoundDetector::RateFits(std::floor(rate_hz), carrier)) return "";
+  const int needed = static_cast<int>(2 * (carrier + HotsoundDetector::kHalfBandwidth)) + 1;
+  return Concat("hotsound needs a sample rate of at least ", needed, " Hz (the ",
+                std::lround(carrier), " Hz carrier and its band), got ",
+                static_cast<int>(rate_hz), " Hz");
+}
+
+std::string CheckReceiverSettings(const ModemSettings& modem, const ReceiverSettings& r,
+                                  float rate_hz, int num_channels) {
+  if (r.max_candidates < 1 || r.max_candidates > 6) {
+    return Concat("max_candidates must be in [1, 6], got ", r.max_candidates);
+  }
+  if (!(rate_hz > 0) || !std::isfinite(rate_hz) || num_channels < 1) {
+    return "the input needs a positive rate and channel count";
+  }
+  // The rates the decoders are fuzzed at; far outside them their
+  // resamplers cannot be built.
+  if (!(rate_hz >= 8000.0f && rate_hz <= 192000.0f)) {
+    return Concat("the input rate must be between 8000 and 192000 Hz, got ", rate_hz);
+  }
+  if (!(r.detection_duration >= 0.0f && r.detection_duration <= 10.0f)) {
+    return Concat("detection_duration must be in [0, 10] s, got ", r.detection_duration);
+  }
+  if (!(r.detection_threshold >= 0.0f) || !std::isfinite(r.detection_threshold)) {
+    return Concat("detection_threshold must not be negative, got ", r.detection_threshold);
+  }
+  // The fuzzers cover 0.25 to 12 token durations.
+  if (r.buffer_duration_factor &&
+      !(*r.buffer_duration_factor >= 0.25f && *r.buffer_duration_factor <= 12.0f)) {
+    return Concat("buffer_duration_factor must be in [0.25, 12], got ",
+                  *r.buffer_duration_factor);
+  }
+  if (r.hotsound && !modem.is_dsss()) return "hotsound works with the dsss scheme";
+  if (r.hotsound) {
+    if (std::string e = CheckHotsoundRate(rate_hz); !e.empty()) return e;
+  }
+  // The DSSS carrier needs a receiver rate above twice its frequency.
+  if (modem.is_dsss() && rate_hz < 2 * modem.dsss.coder.desired_carrier_frequency) {
+    return Concat("a ", static_cast<int>(rate_hz), " Hz input cannot carry the ",
+                  static_cast<int>(modem.dsss.coder.desired_carrier_frequency), " Hz carrier");
+  }
+  return "";
+}
+
+std::unique_ptr<AudioModemDecoder> MakeDecoder(const ModemSettings& modem,
+                                               const ReceiverSettings& receiver, float rate_hz,
+                                               int num_channels,
+                                               HotsoundDecoder::Clock hotsound_clock) {
+  if (modem.is_dsss()) {
+    DsssDecoderConfig config;
+    config.coder = modem.dsss.coder;
+    config.token_length_bytes = modem.TokenBytes();
+    config.append_check_symbol = modem.dsss.append_check_symbol;
+    config.max_candidates_to_return = receiver.max_candidates;
+    config.num_channels = num_channels;
+    config.with_hotsound = receiver.hotsound;
+    config.detection_duration = receiver.detection_duration;
+    config.detection_threshold = receiver.detection_threshold;
+    config.input_sample_rate = rate_hz;
+    if (receiver.buffer_duration_factor) {
+      config.buffer_duration_factor = *receiver.buffer_duration_factor;
+    }
+    config.hotsound_clock = std::move(hotsound_clock);
+    return MakeDsssDecoder(config);
+  }
+  DtmfDecoderConfig config;
+  config.tones = modem.dtmf;
+  config.max_candidates_per_decode_token_call = receiver.max_candidates;
+  config.num_channels = num_channels;
+  config.input_sample_rate = rate_hz;
+  if (receiver.buffer_duration_factor) {
+    config.buffer_duration_factor = *receiver.buffer_duration_factor;
+  }
+  return MakeDtmfDecoder(config);
+}
+
+HotsoundDecoder::Clock AudioTimeClock(const int64_t* frames, float rate_hz) {
+  return [frames, rate_hz] {
+    return std::chrono::steady_clock::time_point() +
+           std::chrono::microseconds(static_cast<int64_t>(*frames * 1e6 / rate_hz));
+  };
 }
 
 }  // namespace audio_sorvane

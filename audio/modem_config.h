@@ -7,6 +7,8 @@
 #define AUDIO_MODEM_CONFIG_H_
 
 #include <array>
+#include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -112,6 +114,67 @@ std::unique_ptr<AudioModemEncoder> MakeDtmfEncoder(const DtmfConfig& config);
 // refused.
 std::unique_ptr<AudioModemDecoder> MakeDsssDecoder(const DsssDecoderConfig& config);
 std::unique_ptr<AudioModemDecoder> MakeDtmfDecoder(const DtmfDecoderConfig& config);
+
+// The settings a person picks (the command-line tool's options, the Python
+// module's keywords): the scheme, the CRC and both schemes' settings, the
+// scheme-dependent ones left empty for the scheme's default.
+struct ModemSettings {
+  std::string scheme = "dsss";  // "dsss" or "dtmf"
+  bool crc = false;
+  std::optional<int> token_bytes;        // scheme default: 8 DSSS, 5 multi-tone
+  std::optional<int> decimation_factor;  // scheme default: 3 DSSS, 16 multi-tone
+  DsssEncoderConfig dsss;  // dsss.coder.sample_rate is the frame rate of both schemes
+  DtmfConfig dtmf;
+  std::vector<float> adsr;  // empty: half-sine window; else the five values
+
+  bool is_dsss() const { return scheme == "dsss"; }
+  int TokenBytes() const { return token_bytes.value_or(is_dsss() ? 8 : 5); }
+  int MessageBytes() const { return TokenBytes() - (crc ? 2 : 0); }
+};
+
+// Resolves the scheme defaults into settings.dsss / settings.dtmf and
+// checks them. Returns "" or a one-line problem.
+std::string ResolveModemSettings(ModemSettings& settings);
+
+// Why a message of `message_bytes` bytes cannot be sent with the resolved
+// `settings`, or "".
+std::string CheckMessageBytes(const ModemSettings& settings, size_t message_bytes);
+
+// The encoder of resolved settings; null when the ADSR window is refused
+// (which is logged).
+std::unique_ptr<AudioModemEncoder> MakeEncoder(const ModemSettings& settings);
+
+// The receiver's own settings.
+struct ReceiverSettings {
+  bool hotsound = false;  // DSSS behind the wake-up detector
+  int max_candidates = 2;  // per token request, 1..6
+  float detection_duration = 0.175f;  // s, DSSS broadcaster detection window
+  float detection_threshold = 4.0f;
+  std::optional<float> buffer_duration_factor;  // scheme default: 4 DSSS, 6 multi-tone
+};
+
+// Why the hotsound wake-up detector cannot listen at `rate_hz` (its
+// carrier band does not fit below half the rate), or "".
+std::string CheckHotsoundRate(double rate_hz);
+
+// Why a receiver with these settings cannot take input at `rate_hz` (8 to
+// 192 kHz) with `num_channels` interleaved channels, or "". `modem` must be
+// resolved.
+std::string CheckReceiverSettings(const ModemSettings& modem, const ReceiverSettings& receiver,
+                                  float rate_hz, int num_channels);
+
+// The initialised decoder of settings that passed CheckReceiverSettings
+// (others end the process through CHECK); null when the ADSR window is
+// refused. `hotsound_clock` as in DsssDecoderConfig.
+std::unique_ptr<AudioModemDecoder> MakeDecoder(const ModemSettings& modem,
+                                               const ReceiverSettings& receiver, float rate_hz,
+                                               int num_channels,
+                                               HotsoundDecoder::Clock hotsound_clock = {});
+
+// A hotsound clock that follows the audio rather than the wall: `*frames`
+// frames at `rate_hz` after an arbitrary epoch. For audio decoded faster
+// than real time; `frames` must outlive the clock.
+HotsoundDecoder::Clock AudioTimeClock(const int64_t* frames, float rate_hz);
 
 }  // namespace audio_sorvane
 

@@ -168,6 +168,24 @@ std::vector<float> RoomImpulseResponse(double rt60, double direct_to_reverberant
   return h;
 }
 
+std::string CheckChannel(const ChannelConfig& c) {
+  if (!(c.room.distance > 0)) return "distance must be positive";
+  if (!(c.input_rate > 0 && c.input_rate <= 1e6) || !(c.output_rate > 0 && c.output_rate <= 1e6)) {
+    return "sample rates must be positive (at most 1 MHz)";
+  }
+  if (!(std::fabs(c.speed) < kSpeedOfSound)) return "speed must be below the speed of sound";
+  if (!(c.rt60 >= 0 && c.rt60 <= 20) || !(c.band_limit >= 0) || !(c.clip >= 0)) {
+    return "rt60 (at most 20 s), band_limit and clip must not be negative";
+  }
+  if (std::isnan(c.snr_db) || !std::isfinite(c.gain_db) ||
+      !std::isfinite(c.interference_gain_db) || !(c.leading_silence >= 0) ||
+      !(c.trailing_silence >= 0) || c.channels < 1) {
+    return "snr_db must be a number, gains finite, silences not negative, channels positive";
+  }
+  if (c.room.HasSize()) return CheckRoom(c.room);
+  return "";
+}
+
 std::vector<float> ApplyChannel(std::span<const float> broadcast, const ChannelConfig& config) {
   // Motion: a source approaching at v is heard (1 + v / c) times faster.
   const double speed_factor = 1.0 + config.speed / kSpeedOfSound;

@@ -24,6 +24,7 @@
 #include <cmath>
 #include <cstdint>
 #include <span>
+#include <string>
 #include <vector>
 
 #include "audio/audio_modem_encoder.h"
@@ -64,6 +65,12 @@ struct ChannelConfig {
   double interference_gain_db = 0.0;
   RoomConfig room = {};  // with a size: the physical room instead of rt60
 };
+
+// Why ApplyChannel cannot simulate `config` (a rate that is not positive,
+// a speed of sound or more, a negative RT60, band limit or clip, a room
+// that fails CheckRoom), or "". The distance must be positive even
+// without a room.
+std::string CheckChannel(const ChannelConfig& config);
 
 // The received signal, channels interleaved, on the 16-bit scale (not
 // rounded; clipped only as configured). Empty when the physical room fails

@@ -118,11 +118,7 @@ std::string ResolveChannelOptions(ChannelOptions& o) {
   if (!o.room.empty()) {
     if (std::string e = ParseRooms(o.room, &o.rooms); !e.empty()) return e;
   }
-  if (!(o.config.room.distance > 0)) return "--distance must be positive";
-  if (!(o.config.output_rate > 0)) return "--rate must be positive";
-  if (o.config.rt60 < 0 || o.config.band_limit < 0 || o.config.clip < 0) {
-    return "--rt60, --band-limit and --clip must not be negative";
-  }
+  if (std::string e = sorvel_sim::CheckChannel(o.config); !e.empty()) return e;
   if (o.mix_file.empty()) return "";
   WavData mix;
   if (std::string e = ReadWav(o.mix_file, &mix); !e.empty()) return e;

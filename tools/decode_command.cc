@@ -3,7 +3,6 @@
 #include <sndfile.h>
 
 #include <algorithm>
-#include <chrono>
 #include <cstdint>
 #include <cstdio>
 #include <iostream>
@@ -99,7 +98,7 @@ class AudioSource {
 int Run(DecodeOptions& o) {
   AudioSource source;
   StreamDecoder decoder;
-  std::string error = ResolveModemOptions(o.modem);
+  std::string error = audio_sorvane::ResolveModemSettings(o.modem);
   if (error.empty()) error = source.Open(o);
   if (error.empty()) error = decoder.Start(o.modem, o.receiver, source.rate(), source.channels());
   if (!error.empty()) {
@@ -143,53 +142,19 @@ std::string StreamDecoder::Start(const ModemOptions& modem, const ReceiverOption
   rate_ = rate;
   channels_ = channels;
   if (receiver.interval_ms <= 0) return "--interval must be positive";
-  if (receiver.max_candidates < 1 || receiver.max_candidates > 6) {
-    return "--max-candidates must be in [1, 6]";
-  }
-  if (rate <= 0 || channels < 1) return "the input needs a positive rate and channel count";
-  if (receiver.hotsound && !modem.is_dsss()) return "--hotsound works with the dsss scheme";
-  if (receiver.hotsound) {
+  // The flag's own words first; the library names the setting.
+  if (receiver.hotsound && modem.is_dsss()) {
     if (std::string e = CheckHotsoundRate(rate); !e.empty()) return e;
   }
-  // The DSSS carrier needs a receiver rate above twice its frequency.
-  if (modem.is_dsss() && rate < 2 * modem.dsss.coder.desired_carrier_frequency) {
-    return "a " + std::to_string(static_cast<int>(rate)) + " Hz input cannot carry the " +
-           std::to_string(static_cast<int>(modem.dsss.coder.desired_carrier_frequency)) +
-           " Hz carrier";
+  if (std::string e = audio_sorvane::CheckReceiverSettings(modem, receiver, rate, channels);
+      !e.empty()) {
+    return e;
   }
-  if (modem.is_dsss()) {
-    audio_sorvane::DsssDecoderConfig config;
-    config.coder = modem.dsss.coder;
-    config.token_length_bytes = modem.TokenBytes();
-    config.append_check_symbol = modem.dsss.append_check_symbol;
-    config.max_candidates_to_return = receiver.max_candidates;
-    config.num_channels = channels;
-    config.with_hotsound = receiver.hotsound;
-    config.detection_duration = receiver.detection_duration;
-    config.detection_threshold = receiver.detection_threshold;
-    config.input_sample_rate = rate;
-    if (receiver.buffer_duration_factor) {
-      config.buffer_duration_factor = *receiver.buffer_duration_factor;
-    }
-    // Input is read as fast as it decodes: the hotsound timeout runs on
-    // the audio's time.
-    config.hotsound_clock = [this] {
-      return std::chrono::steady_clock::time_point() +
-             std::chrono::microseconds(frames_ * 1000000 / static_cast<int64_t>(rate_));
-    };
-    decoder_ = audio_sorvane::MakeDsssDecoder(config);
-  } else {
-    audio_sorvane::DtmfDecoderConfig config;
-    config.tones = modem.dtmf;
-    config.max_candidates_per_decode_token_call = receiver.max_candidates;
-    config.num_channels = channels;
-    config.input_sample_rate = rate;
-    if (receiver.buffer_duration_factor) {
-      config.buffer_duration_factor = *receiver.buffer_duration_factor;
-    }
-    decoder_ = audio_sorvane::MakeDtmfDecoder(config);
-    if (!decoder_) return "the ADSR window was refused (see the log line above)";
-  }
+  // Input is read as fast as it decodes: the hotsound timeout runs on the
+  // audio's time.
+  decoder_ = audio_sorvane::MakeDecoder(modem, receiver, rate, channels,
+                                        audio_sorvane::AudioTimeClock(&frames_, rate_));
+  if (!decoder_) return "the ADSR window was refused (see the log line above)";
   next_request_ = receiver.interval_ms / 1000.0;
   return "";
 }

@@ -5,7 +5,6 @@
 
 #include <cstdint>
 #include <memory>
-#include <optional>
 #include <set>
 #include <span>
 #include <string>
@@ -13,19 +12,15 @@
 
 #include "CLI/CLI.hpp"
 #include "audio/audio_modem_decoder.h"
+#include "audio/modem_config.h"
 #include "tools/modem_options.h"
 
 namespace sorvel_cli {
 
-// The receiver's own settings.
-struct ReceiverOptions {
-  bool hotsound = false;
+// The receiver's own settings, and how the tool asks and answers.
+struct ReceiverOptions : audio_sorvane::ReceiverSettings {
   int interval_ms = 250;
   bool json = false;
-  int max_candidates = 2;
-  float detection_duration = 0.175f;
-  float detection_threshold = 4.0f;
-  std::optional<float> buffer_duration_factor;
 };
 
 void AddReceiverOptions(CLI::App* command, ReceiverOptions* options);

@@ -35,19 +35,12 @@ std::string PrepareEncoder(ModemOptions& o, const std::string& token_hex,
                            std::unique_ptr<audio_sorvane::AudioModemEncoder>* encoder,
                            std::vector<uint8_t>* message) {
   if (std::string error = ParseHex(token_hex, message); !error.empty()) return error;
-  if (std::string error = ResolveModemOptions(o); !error.empty()) return error;
-  if (static_cast<int>(message->size()) != o.MessageBytes()) {
-    return "token has " + std::to_string(message->size()) + " bytes; the " + o.scheme +
-           " scheme sends " + std::to_string(o.TokenBytes()) + "-byte tokens, so give " +
-           std::to_string(o.MessageBytes()) +
-           (o.crc ? " message bytes (the CRC adds 2)" : " bytes");
+  if (std::string error = audio_sorvane::ResolveModemSettings(o); !error.empty()) return error;
+  if (std::string error = audio_sorvane::CheckMessageBytes(o, message->size()); !error.empty()) {
+    return error;
   }
-  if (o.is_dsss()) {
-    *encoder = audio_sorvane::MakeDsssEncoder(o.dsss);
-  } else {
-    *encoder = audio_sorvane::MakeDtmfEncoder(o.dtmf);
-    if (!*encoder) return "the ADSR window was refused (see the log line above)";
-  }
+  *encoder = audio_sorvane::MakeEncoder(o);
+  if (!*encoder) return "the ADSR window was refused (see the log line above)";
   return "";
 }
 

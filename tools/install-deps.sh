@@ -11,6 +11,7 @@ packages=(
   libsndfile1-dev libcli11-dev
   android-liblog-dev
   espeak-ng xmp fb-music-high
+  python3-pybind11 python3-pytest python3-numpy python3-dev
 )
 
 # Optional groups: --fuzz (clang and its fuzzer runtime), --arm64 (the

@@ -1,10 +1,7 @@
 #include "tools/modem_options.h"
 
 #include <cctype>
-#include <cmath>
 #include <cstdio>
-
-#include "audio/hotsound_detector.h"
 
 namespace sorvel_cli {
 
@@ -68,26 +65,6 @@ void AddModemOptions(CLI::App* command, ModemOptions* o, bool transmitter) {
       ->delimiter(',')->expected(5)->group(dtmf);
 }
 
-std::string ResolveModemOptions(ModemOptions& o) {
-  if (o.MessageBytes() <= 0) {
-    return "token bytes (" + std::to_string(o.TokenBytes()) + ") leave no message bytes";
-  }
-  if (o.is_dsss()) {
-    o.dsss.token_length_bytes = o.TokenBytes();
-    o.dsss.coder.baseband_decimation_factor = o.decimation_factor.value_or(3);
-    if (std::string e = audio_sorvane::ValidateDsssCoderConfig(o.dsss.coder); !e.empty()) {
-      return e;
-    }
-    if (o.dsss.broadcast_sample_rate <= 0) return "broadcast sample rate must be positive";
-    return "";
-  }
-  o.dtmf.bytes_in_token = o.TokenBytes();
-  o.dtmf.sample_rate = o.dsss.coder.sample_rate;
-  o.dtmf.baseband_decimation_factor = o.decimation_factor.value_or(16);
-  if (!o.adsr.empty()) o.dtmf.adsr = {{o.adsr[0], o.adsr[1], o.adsr[2], o.adsr[3], o.adsr[4]}};
-  return audio_sorvane::ValidateDtmfConfig(o.dtmf);
-}
-
 std::string ParseHex(const std::string& hex, std::vector<uint8_t>* bytes) {
   std::string digits;
   for (char c : hex) {
@@ -116,14 +93,8 @@ std::string ToHex(const std::vector<uint8_t>& bytes) {
 }
 
 std::string CheckHotsoundRate(double rate) {
-  using audio_sorvane::HotsoundDetector;
-  const double carrier = audio_sorvane::HotsoundDetectorConfig().frequency;
-  // The detector is built for the whole-Hz rate.
-  if (HotsoundDetector::RateFits(std::floor(rate), carrier)) return "";
-  const int needed = static_cast<int>(2 * (carrier + HotsoundDetector::kHalfBandwidth)) + 1;
-  return "--hotsound needs a sample rate of at least " + std::to_string(needed) + " Hz (the " +
-         std::to_string(static_cast<int>(std::lround(carrier))) + " Hz carrier and its band), got " +
-         std::to_string(static_cast<int>(rate)) + " Hz";
+  const std::string e = audio_sorvane::CheckHotsoundRate(rate);
+  return e.empty() ? e : "--" + e;
 }
 
 }  // namespace sorvel_cli

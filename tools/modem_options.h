@@ -16,31 +16,16 @@ namespace sorvel_cli {
 // Exit code of refused arguments and unreadable input.
 inline constexpr int kUsageError = 2;
 
-struct ModemOptions {
-  std::string scheme = "dsss";
-  bool crc = false;
-  std::optional<int> token_bytes;        // scheme default: 8 DSSS, 5 multi-tone
-  std::optional<int> decimation_factor;  // scheme default: 3 DSSS, 16 multi-tone
-  audio_sorvane::DsssEncoderConfig dsss;
-  audio_sorvane::DtmfConfig dtmf;
-  std::vector<float> adsr;  // empty: half-sine window
-
-  bool is_dsss() const { return scheme == "dsss"; }
-  int TokenBytes() const { return token_bytes.value_or(is_dsss() ? 8 : 5); }
-  int MessageBytes() const { return TokenBytes() - (crc ? 2 : 0); }
-};
+// The settings of audio/modem_config.h; ResolveModemSettings resolves
+// and checks them.
+using ModemOptions = audio_sorvane::ModemSettings;
 
 // Registers the scheme, --crc and the settings on `command`; with
 // `transmitter`, also the settings only the sender has.
 void AddModemOptions(CLI::App* command, ModemOptions* options, bool transmitter);
 
-// Why the hotsound wake-up detector cannot listen at `rate` Hz (its
-// carrier band does not fit below half the rate), or "".
+// audio_sorvane::CheckHotsoundRate, in the words of the --hotsound flag.
 std::string CheckHotsoundRate(double rate);
-
-// Resolves the scheme defaults into options.dsss / options.dtmf and checks
-// them. Returns an empty string or a one-line problem.
-std::string ResolveModemOptions(ModemOptions& options);
 
 // Parses hex ("0a1B2c"; spaces, ':' and '-' allowed between bytes).
 // Returns an empty string or the problem.
