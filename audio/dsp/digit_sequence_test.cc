@@ -28,11 +28,9 @@ TEST(DigitSequenceTest, NormalisesAndConverts) {
 }
 
 #if GTEST_HAS_DEATH_TEST
-TEST(DigitSequenceDeathTest, RejectsOutOfRangeArguments) {
-  EXPECT_DEATH(DigitSequence(Digits{1}, 1), CheckFailed("base >= 2"));
-  EXPECT_DEATH(DigitSequence(Digits{10}, 10), CheckFailed("digit < base_"));
-  EXPECT_DEATH(DigitSequence(Digits{-1}, 10), CheckFailed("digit >= 0"));
-  EXPECT_DEATH(DigitSequence(-5, 10), CheckFailed("value >= 0"));
+// Verifies that a base conversion whose digits would overflow int ends the
+// process.
+TEST(DigitSequenceDeathTest, RejectsOverflowingBases) {
   EXPECT_DEATH(DigitSequence(Digits{1}, 256).ConvertToBase(4194305),
                CheckFailed("result_base <= (std::numeric_limits<int>::max() / 2 + 1) / base_"));
 }

@@ -124,8 +124,6 @@ TEST(KissFftUtilDeathTest, RejectsInvalidArguments) {
                CheckFailed("!input_spectrum.empty()"));
   EXPECT_DEATH(SpectralBandPassFilter(spectrum, nullptr, 0, 1, 1),
                CheckFailed("output_spectrum != nullptr"));
-  EXPECT_DEATH(SpectralBandPassFilter(spectrum, &out, -1, 1, 1),
-               CheckFailed("low_band_edge >= 0.0f"));
   EXPECT_DEATH(SpectralBandPassFilter(spectrum, &out, 0, 5.5f, 1),
                CheckFailed("high_band_edge <= bin_width * spectrum_size"));
   const std::vector<float> signal(10);
@@ -137,8 +135,6 @@ TEST(KissFftUtilDeathTest, RejectsInvalidArguments) {
                            "input.size())"));
   EXPECT_DEATH(BandPassFilter(signal, nullptr, 0, 10, 100),
                CheckFailed("output != nullptr"));
-  EXPECT_DEATH(FftResample(signal, &real_out, 0, 100),
-               CheckFailed("input_sample_rate > 0"));
   EXPECT_DEATH(FftResample(signal, nullptr, 100, 200), CheckFailed("output"));
 }
 #endif

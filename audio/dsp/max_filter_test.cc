@@ -57,7 +57,6 @@ TEST(MaxFilterTest, MatchesDefinition) {
 TEST(MaxFilterDeathTest, RejectsInvalidArguments) {
   float buffer[3] = {};
   EXPECT_DEATH(MaxFilter(buffer, -1, 3, buffer), CheckFailed("num_samples >= 0"));
-  EXPECT_DEATH(MaxFilter(buffer, 3, 0, buffer), CheckFailed("window_size >= 1"));
   EXPECT_DEATH(MaxFilter(nullptr, 3, 3, buffer), CheckFailed("input"));
   EXPECT_DEATH(MaxFilter(buffer, 3, 3, nullptr), CheckFailed("output"));
 }

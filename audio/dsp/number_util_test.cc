@@ -99,13 +99,8 @@ TEST(ArithmeticSequenceTest, SizesAndValues) {
 }
 
 #if GTEST_HAS_DEATH_TEST
-TEST(NumberUtilDeathTest, RejectsInvalidArguments) {
-  EXPECT_DEATH(RationalApproximation(10, std::nan("")), CheckFailed("isfinite(value)"));
-  EXPECT_DEATH(RationalApproximation(0, 1.5), CheckFailed("max_denominator > 0"));
-  const char* kSequenceCheck =
-      "std::isfinite(base_) && std::isfinite(limit_) && "
-      "std::isfinite(step_) && step_ != 0.0";
-  EXPECT_DEATH(ArithmeticSequence(0.0, 0.0, 1.0), CheckFailed(kSequenceCheck));
+// Verifies that a sequence too long to index ends the process.
+TEST(NumberUtilDeathTest, RejectsOversizeSequences) {
   EXPECT_DEATH(ArithmeticSequence(0.0, 1e-6, 1e6),
                CheckFailed("sized <= std::numeric_limits<int>::max()"));
 }

@@ -60,12 +60,5 @@ TEST(ComputeBufferTruncationTest, KeepsWithinBudget) {
   }
 }
 
-#if GTEST_HAS_DEATH_TEST
-TEST(DecodingGroupDeathTest, TimesMustIncrease) {
-  DecodingGroup group(100, 10, 25, 1.0f, 0.2f);
-  EXPECT_DEATH(group.TryAdd(100, 1.0f), sorvel_test::CheckFailed("time > times_.back()"));
-}
-#endif
-
 }  // namespace
 }  // namespace audio_sorvane

@@ -133,6 +133,8 @@ class SorvaneDecoder {
   const AcquisitionScorer& acquisition_scorer() const { return *scorer_; }
 
  private:
+  friend class SorvaneDecoderTestPeer;  // drives the private steps in tests
+
   void ResetStream();
   // The frame start near group time t that the raw scores point at.
   int RefinePeak(int t) const;

@@ -93,7 +93,6 @@ TEST(DesignLowpassTapsTest, OneSidedPassband) {
 #if GTEST_HAS_DEATH_TEST
 TEST(SorvaneUtilDeathTest, RejectsInvalidArguments) {
   std::vector<float> grid;
-  EXPECT_DEATH(FrequencyGrid(0.0f, 1.0f, &grid), CheckFailed("frequency_step > 0.0f"));
   EXPECT_DEATH(FrequencyGrid(1.0f, 1.0f, nullptr), CheckFailed("frequencies"));
   EXPECT_DEATH(PhasorMatrix(grid, 3, 1.0, nullptr), CheckFailed("phasor_matrix"));
   EXPECT_DEATH(MaxFilterResponse(audio_dsp::ComplexMatrix(2, 3),

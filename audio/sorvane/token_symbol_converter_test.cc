@@ -3,7 +3,6 @@
 #include <vector>
 
 #include "gtest/gtest.h"
-#include "tests/test_helpers.h"
 
 namespace audio_sorvane {
 namespace {
@@ -56,16 +55,6 @@ TEST(TokenSymbolConverterTest, DropsIncompleteTrailingByte) {
   converter.SymbolsToToken({2, 2, 1, 3, 3, 3, 3}, &bytes);
   EXPECT_EQ(bytes, std::vector<uint8_t>{0xA7});
 }
-
-#if GTEST_HAS_DEATH_TEST
-TEST(TokenSymbolConverterDeathTest, RejectsWidthsThatDoNotDivideAByte) {
-  for (int bits : {0, 3, 5, 6, 7, 9, -1}) {
-    EXPECT_DEATH(TokenSymbolConverter{bits},
-                 sorvel_test::CheckFailed("BitsPerSymbolOk(bits_per_symbol)"))
-        << bits;
-  }
-}
-#endif
 
 }  // namespace
 }  // namespace audio_sorvane

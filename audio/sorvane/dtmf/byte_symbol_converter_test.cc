@@ -45,10 +45,10 @@ TEST(ByteSymbolConverterTest, RoundTripsAndSkipsTheSpacer) {
 }
 
 #if GTEST_HAS_DEATH_TEST
+// Verifies that symbols outside the alphabet and tokens of the wrong size
+// end the process.
 TEST(ByteSymbolConverterDeathTest, RejectsMalformedInput) {
-  EXPECT_DEATH(ByteSymbolConverter(2, 1, 5), CheckFailed("alphabet_size >= 3"));
   const ByteSymbolConverter middle(10, 3, 1);
-  EXPECT_DEATH(middle.SymbolsToBytes({3, 0, 0}), CheckFailed("symbol != spacer_symbol_"));
   EXPECT_DEATH(middle.SymbolsToBytes({10, 0, 0}), CheckFailed("symbol < alphabet_size_"));
   EXPECT_DEATH(middle.BytesToSymbols({1, 2}),
                CheckFailed("static_cast<int>(bytes.size()) == bytes_in_token_"));

@@ -199,6 +199,8 @@ class DtmfDecoder {
   int baseband_frame_size() const { return baseband_frame_size_; }
 
  private:
+  friend class DtmfDecoderTestPeer;  // drives the private steps in tests
+
   // Brings the per-column signal and noise up to date with the buffers,
   // computing only the columns that changed (see the .cc).
   void UpdateColumnScores();

@@ -80,28 +80,20 @@ TEST(DtmfEncoderParamsTest, SineWindowStartsAtZero) {
 }
 
 #if GTEST_HAS_DEATH_TEST
-TEST(DtmfEncoderParamsDeathTest, CheckRejectsInvalidRecords) {
+// Verifies that records whose tables would be indexed out of range end the
+// process.
+TEST(DtmfEncoderParamsDeathTest, CheckRejectsIndicesOutOfRange) {
   struct Case {
     void (*mutate)(DtmfEncoderParams*);
     const char* check;
   };
   const Case cases[] = {
-      {[](DtmfEncoderParams* p) { p->sample_rate = 0; }, "params.sample_rate > 0.0f"},
-      {[](DtmfEncoderParams* p) { p->window_duration = 0.0001f; }, "frame_size > 0"},
       {[](DtmfEncoderParams* p) { p->window_samples = {1.0f}; },
        "static_cast<int>(params.window_samples.size()) == frame_size"},
-      {[](DtmfEncoderParams* p) { p->tone_frequencies[3] = 22050; },
-       "frequency < nyquist_frequency"},
-      {[](DtmfEncoderParams* p) { p->symbol_table.push_back({0, 1}); },
-       "params.tone_frequencies.size() * (params.tone_frequencies.size() - 1) / 2 >= "
-       "params.symbol_table.size()"},
       {[](DtmfEncoderParams* p) { p->symbol_table[0] = {0, 10}; },
        "index < static_cast<int>(params.tone_frequencies.size())"},
-      {[](DtmfEncoderParams* p) { p->tones_per_symbol = 3; },
-       "static_cast<int>(symbol_frequencies.size()) == params.tones_per_symbol"},
       {[](DtmfEncoderParams* p) { p->spacer_symbol = 45; },
        "params.spacer_symbol < static_cast<int>(params.symbol_table.size())"},
-      {[](DtmfEncoderParams* p) { p->bytes_in_token = 0; }, "params.bytes_in_token > 0"},
   };
   for (const Case& c : cases) {
     DtmfEncoderParams params;
