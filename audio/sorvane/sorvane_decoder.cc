@@ -100,8 +100,10 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
   sample_rate_ = sample_rate;
   const float coder_rate = coder_->params().sample_rate;
   max_buffer_size_ = static_cast<int>(std::lround(params_.buffer_duration * sample_rate));
+  // Frame duration times frames times rate, in this order: GetMaxSafeInputSize
+  // reports the rounded result.
   const int frames_per_token =
-      params_.symbols_in_token + (params_.append_check_symbol ? 1 : 0) + 1;
+      FramesPerToken(params_.symbols_in_token, params_.append_check_symbol);
   max_good_block_size_ = static_cast<int>(std::lround(
       coder_->samples_per_frame() / coder_rate * frames_per_token * sample_rate));
   input_per_baseband_ = static_cast<double>(sample_rate) / baseband_rate_;

@@ -123,6 +123,11 @@ class SorvaneDecoder {
   int GetMaxSafeInputSize() const;
 
   const SymbolWaveCoder& symbol_wave_coder() const { return *coder_; }
+  // Bytes the data symbols of one token carry: bits_per_symbol *
+  // symbols_in_token / 8.
+  int token_length_bytes() const {
+    return coder_->params().bits_per_symbol * params_.symbols_in_token / 8;
+  }
   const SorvaneDecoderParams& params() const { return params_; }
   bool initialized() const { return initialized_; }
   // Buffer occupancy, for bounds checks and diagnostics.

@@ -93,7 +93,7 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
   const RoomSearchParams& room = params_.room_search;
   ToneSequenceSearchParams search;
   search.num_tones = num_frequencies_;
-  search.period = converter_.symbols_in_token() + (params_.use_checksum_symbol ? 1 : 0) + 1;
+  search.period = token_selector_->symbol_period();
   search.tones_per_symbol = params_.tones_per_symbol;
   search.num_taps = room.num_taps;
   search.masks_per_tone = room.masks_per_tone;
@@ -275,7 +275,7 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   received_sample_rate_ = received_sample_rate;
   num_channels_ = num_channels;
   received_per_baseband_ = received_sample_rate_ / baseband_sample_rate_;
-  const int frames = converter_.symbols_in_token() + (params_.use_checksum_symbol ? 1 : 0) + 1;
+  const int frames = token_selector_->symbol_period();
   max_good_block_size_ =
       static_cast<int>(std::lround(frame_duration_ * received_sample_rate_ * frames));
   max_buffer_size_ = static_cast<int>(
