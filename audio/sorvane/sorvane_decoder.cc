@@ -5,6 +5,7 @@
 #include <numbers>
 #include <utility>
 
+#include "audio/dsp/acoustics.h"
 #include "audio/dsp/box_filter.h"
 #include "audio/dsp/float4.h"
 #include "audio/dsp/number_util.h"
@@ -19,8 +20,8 @@ namespace {
 
 using audio_dsp::ComplexVector;
 using audio_dsp::FloatVector;
+using audio_dsp::kSpeedOfSound;
 
-constexpr double kSpeedOfSound = 340.0;  // m/s
 constexpr double kMaxSavedSeconds = 30.0;
 
 }  // namespace

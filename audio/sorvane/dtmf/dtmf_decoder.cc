@@ -5,6 +5,7 @@
 #include <complex>
 #include <numbers>
 
+#include "audio/dsp/acoustics.h"
 #include "audio/dsp/float4.h"
 #include "audio/dsp/gamma_filter.h"
 #include "audio/dsp/number_util.h"
@@ -20,9 +21,8 @@ using audio_dsp::Load8;
 using audio_dsp::Max8;
 using audio_dsp::Min8;
 using audio_dsp::Splat8;
+using audio_dsp::kSpeedOfSound;
 using audio_dsp::Store8;
-
-constexpr double kSpeedOfSound = 340.0;  // m/s
 
 TokenSelectorParams SelectorParams(const DtmfDecoderParams& params, int symbols_in_token) {
   TokenSelectorParams selector;
