@@ -23,6 +23,7 @@
 
 #include "audio/dsp/batch_top_n.h"
 #include "audio/dsp/eigen_types.h"
+#include "audio/sorvane/decode_results.h"
 #include "audio/sorvane/symbol_score_map.h"
 
 namespace audio_sorvane {
@@ -45,14 +46,6 @@ inline float TokenDurationSeconds(int frames_per_token, int samples_per_frame,
                                   float sample_rate) {
   return static_cast<float>(frames_per_token * samples_per_frame) / sample_rate;
 }
-
-// A token candidate.
-struct DecodedToken {
-  std::vector<int> symbols;    // data symbols, from right after the spacer
-  float score = 0.0f;          // summed normalised scores
-  std::vector<uint8_t> bytes;  // filled by the receivers
-  int position = 0;            // where the candidate's spacer was observed
-};
 
 struct TokenSelectorParams {
   int alphabet_size = 17;  // symbols including the spacer
