@@ -8,6 +8,7 @@
 #include "audio/dsp/acoustics.h"
 #include "audio/dsp/box_filter.h"
 #include "audio/dsp/float4.h"
+#include "audio/dsp/lowpass_design.h"
 #include "audio/dsp/number_util.h"
 #include "audio/dsp/resampler.h"
 #include "audio/sorvane/compute_buffer_truncation.h"
@@ -52,7 +53,7 @@ SorvaneDecoder::SorvaneDecoder(std::shared_ptr<const SymbolWaveCoder> symbol_wav
   const int x = static_cast<int>(std::ceil(params_.frame_extension * frame_size_));
   extended_size_ = audio_dsp::RoundUpToMultiple(frame_size_ + 2 * x, phase_block_size_);
   extension_ = (extended_size_ - frame_size_) / 2;
-  PeriodicPad<float>(coder_->baseband_code(), extension_,
+  audio_dsp::PeriodicPad<float>(coder_->baseband_code(), extension_,
                      extended_size_ - frame_size_ - extension_, &extended_code_);
   extended_window_.resize(extended_size_);
   for (int i = 0; i < extended_size_; ++i) {
@@ -63,7 +64,7 @@ SorvaneDecoder::SorvaneDecoder(std::shared_ptr<const SymbolWaveCoder> symbol_wav
                -2.0 * std::numbers::pi / (frame_size_ / phase_block_size_), &symbol_phasors_);
 
   if (params_.use_designed_lowpass) {
-    smoothing_filter_ = std::make_unique<audio_dsp::ComplexFirFilter>(DesignLowpassTaps(
+    smoothing_filter_ = std::make_unique<audio_dsp::ComplexFirFilter>(audio_dsp::DesignLowpassTaps(
         params_.lowpass_num_taps, params_.lowpass_cutoff,
         static_cast<float>(coder_params.upsampling_factor /
                            coder_params.baseband_decimation_factor)));
