@@ -71,7 +71,7 @@ void HotsoundDecoder::UpdateActivity(bool success) {
   }
   const auto elapsed =
       std::chrono::duration_cast<std::chrono::milliseconds>(now - last_activity_).count();
-  if (elapsed >= 1001) state_ = 0;
+  if (elapsed > kIdleTimeoutMs) state_ = 0;
 }
 
 bool HotsoundDecoder::DecodeTokens(DecodeResults* raw_results) {

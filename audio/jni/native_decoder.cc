@@ -48,8 +48,8 @@ extern "C" {
 
 JNIEXPORT jboolean JNICALL
 Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDsss(
-    JNIEnv*, jclass, jint decoder_id, jint token_length_bytes, jboolean deuse_quadrature_a,
-    jboolean deuse_quadrature_b, jint number_of_taps, jint code_number, jint upsampling_factor,
+    JNIEnv*, jclass, jint decoder_id, jint token_length_bytes, jboolean append_check_symbol,
+    jboolean save_received_samples, jint number_of_taps, jint code_number, jint upsampling_factor,
     jint bits_per_symbol, jint min_cycles_per_frame, jint baseband_decimation_factor,
     jboolean use_quadrature, jint max_candidates_to_return, jint num_channels,
     jboolean with_hotsound, jfloat sample_rate, jfloat desired_carrier_frequency,
@@ -60,8 +60,8 @@ Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDsss(
       number_of_taps, code_number, upsampling_factor, bits_per_symbol, min_cycles_per_frame,
       baseband_decimation_factor, use_quadrature, sample_rate, desired_carrier_frequency);
   config.token_length_bytes = token_length_bytes;
-  config.append_check_symbol = deuse_quadrature_a;
-  config.save_received_samples = deuse_quadrature_b;
+  config.append_check_symbol = append_check_symbol;
+  config.save_received_samples = save_received_samples;
   config.max_candidates_to_return = max_candidates_to_return;
   config.num_channels = num_channels;
   config.with_hotsound = with_hotsound;

@@ -119,7 +119,8 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
   mix_step_ = {std::cos(omega * kMixLanes), std::sin(omega * kMixLanes)};
   oscillator_ = {1.0, 0.0};
   baseband_resampler_ = std::make_unique<audio_dsp::RationalFactorResampler<std::complex<float>>>(
-      audio_dsp::DefaultResamplingKernel(sample_rate, baseband_rate_), 2000);
+      audio_dsp::DefaultResamplingKernel(sample_rate, baseband_rate_),
+      audio_dsp::kDefaultMaxDenominator);
   CHECK(baseband_resampler_->Valid()) << "Failed to initialize RationalFactorResampler.";
 
   smoothing_filter_->Reset();

@@ -24,6 +24,10 @@ using audio_dsp::Splat8;
 using audio_dsp::kSpeedOfSound;
 using audio_dsp::Store8;
 
+// Half the 3 dB bandwidth of a half-sine window of T seconds is 0.594 / T Hz
+// (|W(f)|^2 falls to half at f = 0.5945 / T).
+constexpr double kHalfSineHalfBandwidthCycles = 0.594;
+
 TokenSelectorParams SelectorParams(const DtmfDecoderParams& params, int symbols_in_token) {
   TokenSelectorParams selector;
   selector.alphabet_size = static_cast<int>(params.symbol_table.size());
@@ -69,13 +73,13 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
   baseband_sample_rate_ =
       params_.sample_rate / static_cast<float>(params_.baseband_decimation_factor);
 
-  // Tone filter bandwidth: the largest Doppler shift plus the bandwidth of
-  // one symbol frame.
+  // Tone filter bandwidth: the largest Doppler shift plus half the 3 dB
+  // bandwidth of one (half-sine windowed) symbol frame.
   const float highest = *std::max_element(params_.tone_frequencies.begin(),
                                           params_.tone_frequencies.end());
   const double cutoff = static_cast<double>(highest * params_.max_meters_per_second) /
                             kSpeedOfSound +
-                        0.594 / frame_duration_;
+                        kHalfSineHalfBandwidthCycles / frame_duration_;
   tone_bank_ = std::make_unique<ToneFilterBank>(params_.baseband_decimation_factor,
                                                 params_.sample_rate, params_.tone_frequencies,
                                                 cutoff, params_.use_reference_paths);
@@ -284,7 +288,8 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
     received_resampler_.reset();
   } else {
     received_resampler_ = std::make_unique<audio_dsp::RationalFactorResampler<float>>(
-        audio_dsp::DefaultResamplingKernel(received_sample_rate_, params_.sample_rate), 2000);
+        audio_dsp::DefaultResamplingKernel(received_sample_rate_, params_.sample_rate),
+        audio_dsp::kDefaultMaxDenominator);
     CHECK(received_resampler_->Valid()) << "Failed to initialize RationalFactorResampler.";
   }
   tone_strength_buffer_size_ = 0;
