@@ -185,21 +185,17 @@ void SorvaneDecoder::ProcessSamples(std::span<const float> received_samples) {
     LOG(ERROR) << "ProcessSamples() called before call to Initialize().";
     return;
   }
-  const int input_size = static_cast<int>(received_samples.size()) / num_channels_;
-  const int buffered_size = static_cast<int>(
-      std::ceil(input_per_baseband_ * (acquisition_scores_.size() + 1)));
-  const BufferTruncation truncation = ComputeBufferTruncation(
-      input_size, buffered_size, max_good_block_size_, max_buffer_size_);
-  const int skip = truncation.skip * num_channels_;
-  const int drop = static_cast<int>(std::ceil(truncation.drop / input_per_baseband_));
+  const BlockTruncation truncation = ComputeBlockTruncation(
+      static_cast<int>(received_samples.size()), num_channels_, input_per_baseband_,
+      acquisition_scores_.size(), frame_size_, max_good_block_size_, max_buffer_size_);
+  const int skip = truncation.skip_samples;
   if (skip >= 1) {
     ResetStream();
     Initialize(num_channels_, sample_rate_);
     received_samples = received_samples.subspan(
         std::min<size_t>(static_cast<size_t>(skip), received_samples.size()));
-  } else if (drop >= 1) {
-    const int d = std::min(audio_dsp::RoundUpToMultiple(drop, frame_size_),
-                           acquisition_scores_.size());
+  } else if (truncation.drop_baseband >= 1) {
+    const int d = truncation.drop_baseband;
     num_scored_ -= d;
     baseband_real_.Discard(d);
     baseband_imaginary_.Discard(d);

@@ -340,24 +340,19 @@ void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
     return;
   }
   if (received_samples.empty()) return;
-  const int frames = static_cast<int>(received_samples.size()) / num_channels_;
-  const int buffered = static_cast<int>(
-      std::ceil(received_per_baseband_ * (tone_strength_buffer_size_ + 1)));
-  const BufferTruncation truncation =
-      ComputeBufferTruncation(frames, buffered, max_good_block_size_, max_buffer_size_);
-  const int skip_samples = truncation.skip * num_channels_;
-  const int drop_baseband =
-      static_cast<int>(std::ceil(truncation.drop / received_per_baseband_));
+  // Drops whole symbol periods, so the symbol phase of the buffers is kept.
+  const BlockTruncation truncation = ComputeBlockTruncation(
+      static_cast<int>(received_samples.size()), num_channels_, received_per_baseband_,
+      tone_strength_buffer_size_, baseband_frame_size_, max_good_block_size_, max_buffer_size_);
+  const int skip_samples = truncation.skip_samples;
   if (skip_samples >= 1) {
     Init(num_channels_, received_sample_rate_);
     ProcessSamples(received_samples.subspan(
         std::min<size_t>(static_cast<size_t>(skip_samples), received_samples.size())));
     return;
   }
-  if (drop_baseband >= 1) {
-    // Whole symbol periods, so the symbol phase of the buffers is kept.
-    const int drop = std::min(audio_dsp::RoundUpToMultiple(drop_baseband, baseband_frame_size_),
-                              tone_strength_buffer_size_);
+  if (truncation.drop_baseband >= 1) {
+    const int drop = truncation.drop_baseband;
     begin_ += drop;
     tone_strength_buffer_size_ -= drop;
   }
