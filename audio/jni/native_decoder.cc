@@ -81,14 +81,10 @@ Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDtmf(
     jfloat adsr_2, jfloat adsr_3, jfloat adsr_4, jfloat adsr_5, jfloat buffer_duration_factor,
     jfloatArray tone_frequencies) {
   audio_sorvane::DtmfDecoderConfig config;
-  config.tones.bytes_in_token = bytes_in_token;
-  config.tones.use_checksum_symbol = use_checksum_symbol;
-  config.tones.baseband_decimation_factor = baseband_decimation_factor;
-  config.tones.tones_per_symbol = tones_per_symbol;
-  config.tones.sample_rate = sample_rate;
-  config.tones.window_duration = window_duration;
-  config.tones.adsr = {adsr_1, adsr_2, adsr_3, adsr_4, adsr_5};
-  if (!audio_sorvane::ReadFloatArray(env, tone_frequencies, &config.tones.tone_frequencies)) {
+  if (!audio_sorvane::ReadDtmfConfig(env, bytes_in_token, use_checksum_symbol,
+                                     baseband_decimation_factor, tones_per_symbol,
+                                     tone_frequencies, sample_rate, window_duration,
+                                     {adsr_1, adsr_2, adsr_3, adsr_4, adsr_5}, &config.tones)) {
     return JNI_FALSE;
   }
   config.max_candidates_per_decode_token_call = max_candidates_per_decode_token_call;
