@@ -13,8 +13,7 @@ AudioModemDecoder::AudioModemDecoder(std::unique_ptr<SorvaneDecoder> dsss_decode
     : kind_(kDsss) {
   CHECK(dsss_decoder);
   dsss_decoder_ = std::move(dsss_decoder);
-  token_length_bytes_ = dsss_decoder_->symbol_wave_coder().params().bits_per_symbol *
-                        dsss_decoder_->params().symbols_in_token / 8;
+  token_length_bytes_ = dsss_decoder_->token_length_bytes();
 }
 
 AudioModemDecoder::AudioModemDecoder(std::unique_ptr<HotsoundDecoder> hotsound_decoder)

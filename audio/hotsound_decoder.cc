@@ -17,8 +17,7 @@ HotsoundDecoder::HotsoundDecoder(std::unique_ptr<SorvaneDecoder> dsss_decoder,
   CHECK(hotsound_detector);
   dsss_decoder_ = std::move(dsss_decoder);
   hotsound_detector_ = std::move(hotsound_detector);
-  token_length_bytes_ = dsss_decoder_->symbol_wave_coder().params().bits_per_symbol *
-                        dsss_decoder_->params().symbols_in_token / 8;
+  token_length_bytes_ = dsss_decoder_->token_length_bytes();
 }
 
 void HotsoundDecoder::Initialize(int num_channels, float input_sample_rate) {
@@ -72,7 +71,7 @@ void HotsoundDecoder::UpdateActivity(bool success) {
   }
   const auto elapsed =
       std::chrono::duration_cast<std::chrono::milliseconds>(now - last_activity_).count();
-  if (elapsed >= 1001) state_ = 0;
+  if (elapsed > kIdleTimeoutMs) state_ = 0;
 }
 
 bool HotsoundDecoder::DecodeTokens(DecodeResults* raw_results) {

@@ -31,6 +31,9 @@ class HotsoundDecoder {
  public:
   using Clock = std::function<std::chrono::steady_clock::time_point()>;
   static constexpr int kPreTriggerCapacity = 14400;
+  // A triggered decoder goes back to listening once it has reported nothing
+  // for more than this long (whole milliseconds).
+  static constexpr int64_t kIdleTimeoutMs = 1000;
 
   HotsoundDecoder(std::unique_ptr<SorvaneDecoder> dsss_decoder,
                   std::unique_ptr<HotsoundDetector> hotsound_detector,

@@ -155,11 +155,10 @@ std::unique_ptr<AudioModemDecoder> MakeDsssDecoder(const DsssDecoderConfig& conf
   params.max_candidates_to_return = config.max_candidates_to_return;
   params.detection_duration = config.detection_duration;
   params.detection_threshold = config.detection_threshold;
-  const float token_seconds =
-      static_cast<float>((params.symbols_in_token + (config.append_check_symbol ? 2 : 1)) *
-                         coder->samples_per_frame()) /
-      config.coder.sample_rate;
-  params.buffer_duration = token_seconds * config.buffer_duration_factor;
+  params.buffer_duration =
+      TokenDurationSeconds(FramesPerToken(params.symbols_in_token, params.append_check_symbol),
+                           coder->samples_per_frame(), config.coder.sample_rate) *
+      config.buffer_duration_factor;
   auto dsss = std::make_unique<SorvaneDecoder>(std::move(coder), params);
   std::unique_ptr<AudioModemDecoder> decoder;
   if (config.with_hotsound) {

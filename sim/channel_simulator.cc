@@ -61,7 +61,7 @@ std::vector<float> ResampleHighQuality(std::span<const float> input, double inpu
                                        double output_rate) {
   if (input_rate == output_rate) return {input.begin(), input.end()};
   audio_dsp::RationalFactorResampler<float> resampler(
-      WidebandKernel(input_rate, output_rate), 2000);
+      WidebandKernel(input_rate, output_rate), audio_dsp::kDefaultMaxDenominator);
   std::vector<float> out, tail;
   resampler.ProcessSamples(input, &out);
   resampler.Flush(&tail);

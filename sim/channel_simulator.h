@@ -28,11 +28,12 @@
 #include <vector>
 
 #include "audio/audio_modem_encoder.h"
+#include "audio/dsp/acoustics.h"
 #include "sim/room_model.h"
 
 namespace sorvel_sim {
 
-inline constexpr double kSpeedOfSound = 340.0;  // m/s
+using audio_dsp::kSpeedOfSound;  // m/s, as the receivers assume
 
 // What a phone plays: for DSSS the start transition, the token repeated to
 // fill `seconds` (at least once) and the fade-out; for the multi-tone scheme

@@ -23,6 +23,11 @@
 
 namespace audio_dsp {
 
+// The max_denominator the receivers and the simulator use: the exact ratios
+// between the usual audio rates and the baseband rates fit (48000 Hz to
+// 14700 Hz is 160/49), and the phase filters stay at most 2000.
+inline constexpr int kDefaultMaxDenominator = 2000;
+
 template <typename T>
 class RationalFactorResampler : public Resampler<T> {
  public:

@@ -6,6 +6,9 @@
 // State carries across calls, so filtering a signal in pieces gives the same
 // output as filtering it at once. Not thread safe. Empty taps or a null
 // result end the process through CHECK.
+//
+// PeriodicPad: a signal repeated cyclically on both sides. Stateless; an
+// empty signal or a null output ends the process through CHECK.
 #ifndef AUDIO_DSP_SIGNAL_VECTOR_UTIL_H_
 #define AUDIO_DSP_SIGNAL_VECTOR_UTIL_H_
 
@@ -57,6 +60,24 @@ class ComplexFirFilter {
   std::vector<std::complex<float>> impulse_response_;
   std::vector<std::complex<float>> state_;
 };
+
+// `signal` repeated cyclically: pad_before + signal.size() + pad_after
+// values, value i = signal[(i - pad_before) mod signal.size()].
+template <typename T>
+void PeriodicPad(std::span<const T> signal, int pad_before, int pad_after,
+                 std::vector<T>* padded_signal) {
+  CHECK(!signal.empty());
+  CHECK(padded_signal);
+  const int n = static_cast<int>(signal.size());
+  padded_signal->resize(pad_before + n + pad_after);
+  // Start at the index of value 0 and walk forward without a per-value
+  // division.
+  int j = ((-pad_before) % n + n) % n;
+  for (T& value : *padded_signal) {
+    value = signal[j];
+    if (++j == n) j = 0;
+  }
+}
 
 }  // namespace audio_dsp
 

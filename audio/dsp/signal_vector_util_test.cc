@@ -4,6 +4,7 @@
 #include <random>
 #include <vector>
 
+#include "gmock/gmock.h"
 #include "gtest/gtest.h"
 #include "tests/test_helpers.h"
 
@@ -12,6 +13,7 @@ namespace {
 
 using Complex = std::complex<float>;
 using sorvel_test::CheckFailed;
+using testing::ElementsAre;
 
 std::vector<Complex> RandomComplex(int n, std::mt19937* rng) {
   std::normal_distribution<float> normal;
@@ -67,11 +69,29 @@ TEST(ComplexFirFilterTest, StreamsLikeOneConvolution) {
   }
 }
 
+TEST(PeriodicPadTest, RepeatsSignalCyclically) {
+  const std::vector<int> signal = {1, 2, 3};
+  std::vector<int> padded;
+  PeriodicPad<int>(signal, 2, 1, &padded);
+  EXPECT_THAT(padded, ElementsAre(2, 3, 1, 2, 3, 1));
+  PeriodicPad<int>(signal, 7, 0, &padded);
+  EXPECT_THAT(padded, ElementsAre(3, 1, 2, 3, 1, 2, 3, 1, 2, 3));
+  PeriodicPad<int>(signal, 0, 0, &padded);
+  EXPECT_EQ(padded, signal);
+}
+
 #if GTEST_HAS_DEATH_TEST
 TEST(ComplexFirFilterDeathTest, RejectsEmptyTapsAndNullResult) {
   EXPECT_DEATH(ComplexFirFilter(std::vector<Complex>{}), CheckFailed("!impulse_response_.empty()"));
   ComplexFirFilter filter(std::vector<Complex>{{1.0f, 0.0f}});
   EXPECT_DEATH(filter.Filter({}, nullptr), CheckFailed("result"));
+}
+
+TEST(PeriodicPadDeathTest, RejectsEmptySignalAndNullOutput) {
+  std::vector<float> padded;
+  EXPECT_DEATH(PeriodicPad<float>({}, 1, 1, &padded), CheckFailed("!signal.empty()"));
+  const std::vector<float> one = {1.0f};
+  EXPECT_DEATH(PeriodicPad<float>(one, 1, 1, nullptr), CheckFailed("padded_signal"));
 }
 #endif
 

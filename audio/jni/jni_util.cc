@@ -36,6 +36,20 @@ bool ReadFloatArray(JNIEnv* env, jfloatArray array, std::vector<float>* values) 
   return true;
 }
 
+bool ReadDtmfConfig(JNIEnv* env, jint bytes_in_token, jboolean use_checksum_symbol,
+                    jint baseband_decimation_factor, jint tones_per_symbol,
+                    jfloatArray tone_frequencies, jfloat sample_rate, jfloat window_duration,
+                    const std::array<float, 5>& adsr, DtmfConfig* config) {
+  config->bytes_in_token = bytes_in_token;
+  config->use_checksum_symbol = use_checksum_symbol;
+  config->baseband_decimation_factor = baseband_decimation_factor;
+  config->tones_per_symbol = tones_per_symbol;
+  config->sample_rate = sample_rate;
+  config->window_duration = window_duration;
+  config->adsr = adsr;
+  return ReadFloatArray(env, tone_frequencies, &config->tone_frequencies);
+}
+
 jbyteArray FloatsToPcmByteArray(JNIEnv* env, std::span<const float> samples) {
   const std::vector<int8_t> bytes = FloatsToPcm16Le(samples);
   const jsize size = static_cast<jsize>(bytes.size());

@@ -4,6 +4,7 @@
 
 #include <jni.h>
 
+#include <array>
 #include <span>
 #include <vector>
 
@@ -37,6 +38,13 @@ DsssCoderConfig MakeDsssCoderConfig(jint number_of_taps, jint code_number,
                                     jint min_cycles_per_frame, jint baseband_decimation_factor,
                                     jboolean use_quadrature, jfloat sample_rate,
                                     jfloat desired_carrier_frequency);
+
+// The multi-tone settings both peers receive, `adsr` being adsr_1 .. adsr_5.
+// False when the tone array cannot be read.
+bool ReadDtmfConfig(JNIEnv* env, jint bytes_in_token, jboolean use_checksum_symbol,
+                    jint baseband_decimation_factor, jint tones_per_symbol,
+                    jfloatArray tone_frequencies, jfloat sample_rate, jfloat window_duration,
+                    const std::array<float, 5>& adsr, DtmfConfig* config);
 
 // Copies a Java float[] (null reads as empty). False when the elements
 // cannot be read.

@@ -48,8 +48,8 @@ extern "C" {
 
 JNIEXPORT jboolean JNICALL
 Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDsss(
-    JNIEnv*, jclass, jint decoder_id, jint token_length_bytes, jboolean deuse_quadrature_a,
-    jboolean deuse_quadrature_b, jint number_of_taps, jint code_number, jint upsampling_factor,
+    JNIEnv*, jclass, jint decoder_id, jint token_length_bytes, jboolean append_check_symbol,
+    jboolean save_received_samples, jint number_of_taps, jint code_number, jint upsampling_factor,
     jint bits_per_symbol, jint min_cycles_per_frame, jint baseband_decimation_factor,
     jboolean use_quadrature, jint max_candidates_to_return, jint num_channels,
     jboolean with_hotsound, jfloat sample_rate, jfloat desired_carrier_frequency,
@@ -60,8 +60,8 @@ Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDsss(
       number_of_taps, code_number, upsampling_factor, bits_per_symbol, min_cycles_per_frame,
       baseband_decimation_factor, use_quadrature, sample_rate, desired_carrier_frequency);
   config.token_length_bytes = token_length_bytes;
-  config.append_check_symbol = deuse_quadrature_a;
-  config.save_received_samples = deuse_quadrature_b;
+  config.append_check_symbol = append_check_symbol;
+  config.save_received_samples = save_received_samples;
   config.max_candidates_to_return = max_candidates_to_return;
   config.num_channels = num_channels;
   config.with_hotsound = with_hotsound;
@@ -81,14 +81,10 @@ Java_com_tessal_android_orv_audiomodem_NativeDecoder_nativeInitializeDtmf(
     jfloat adsr_2, jfloat adsr_3, jfloat adsr_4, jfloat adsr_5, jfloat buffer_duration_factor,
     jfloatArray tone_frequencies) {
   audio_sorvane::DtmfDecoderConfig config;
-  config.tones.bytes_in_token = bytes_in_token;
-  config.tones.use_checksum_symbol = use_checksum_symbol;
-  config.tones.baseband_decimation_factor = baseband_decimation_factor;
-  config.tones.tones_per_symbol = tones_per_symbol;
-  config.tones.sample_rate = sample_rate;
-  config.tones.window_duration = window_duration;
-  config.tones.adsr = {adsr_1, adsr_2, adsr_3, adsr_4, adsr_5};
-  if (!audio_sorvane::ReadFloatArray(env, tone_frequencies, &config.tones.tone_frequencies)) {
+  if (!audio_sorvane::ReadDtmfConfig(env, bytes_in_token, use_checksum_symbol,
+                                     baseband_decimation_factor, tones_per_symbol,
+                                     tone_frequencies, sample_rate, window_duration,
+                                     {adsr_1, adsr_2, adsr_3, adsr_4, adsr_5}, &config.tones)) {
     return JNI_FALSE;
   }
   config.max_candidates_per_decode_token_call = max_candidates_per_decode_token_call;

@@ -63,14 +63,10 @@ Java_com_tessal_android_orv_audiomodem_NativeEncoder_nativeInitializeDtmf(
     jfloatArray tone_frequencies, jfloat sample_rate, jfloat window_duration,
     jfloat adsr_1, jfloat adsr_2, jfloat adsr_3, jfloat adsr_4, jfloat adsr_5) {
   audio_sorvane::DtmfConfig config;
-  config.bytes_in_token = bytes_in_token;
-  config.use_checksum_symbol = use_checksum_symbol;
-  config.baseband_decimation_factor = baseband_decimation_factor;
-  config.tones_per_symbol = tones_per_symbol;
-  config.sample_rate = sample_rate;
-  config.window_duration = window_duration;
-  config.adsr = {adsr_1, adsr_2, adsr_3, adsr_4, adsr_5};
-  if (!audio_sorvane::ReadFloatArray(env, tone_frequencies, &config.tone_frequencies)) {
+  if (!audio_sorvane::ReadDtmfConfig(env, bytes_in_token, use_checksum_symbol,
+                                     baseband_decimation_factor, tones_per_symbol,
+                                     tone_frequencies, sample_rate, window_duration,
+                                     {adsr_1, adsr_2, adsr_3, adsr_4, adsr_5}, &config)) {
     return JNI_FALSE;
   }
   std::unique_ptr<AudioModemEncoder> encoder = audio_sorvane::MakeDtmfEncoder(config);

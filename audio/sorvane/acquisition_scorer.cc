@@ -219,14 +219,15 @@ SORVEL_MULTIVERSION void FrequencyPowers(const float* phasors_real,
   }
 }
 
-// Delay N and gain alpha of two cascaded one-pole stages whose combined
-// impulse response has spread `width` frames: v = width^2 / 24,
-// a = 1 + (1 - sqrt(1 + 2v)) / v, N = round(2a / (1 - a)), alpha = 1 - a.
-void DesignNoiseSmoother(double width, int* delay, float* alpha) {
-  const double v = width * width / 24.0;
-  const double a = 1.0 + (1.0 - std::sqrt(1.0 + 2.0 * v)) / v;
-  *delay = static_cast<int>(std::lround(2.0 * a / (1.0 - a)));
-  *alpha = static_cast<float>(1.0 - a);
+constexpr int kNoiseSmootherOrder = 2;
+
+// The noise smoother for a smoothing width of `width` frames: two gamma
+// stages whose impulse response has a standard deviation of
+// width / sqrt(24) frames.
+audio_dsp::GammaFilter MakeNoiseSmoother(double width) {
+  return audio_dsp::GammaFilter(
+      kNoiseSmootherOrder, /*sample_rate=*/1.0,
+      audio_dsp::GammaFilterPoleFromStddev(width / std::sqrt(24.0), kNoiseSmootherOrder));
 }
 
 
@@ -260,11 +261,12 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
       detection_num_frames_((detection_window_size_ + 1 - frame_size_) / frame_size_),
       detection_num_shifts_(detection_window_size_ + 1 - detection_num_frames_ * frame_size_),
       chunk_size_(0),
-      last_chunk_size_(0) {
+      last_chunk_size_(0),
+      noise_smoother_(MakeNoiseSmoother(smoothing_width)),
+      noise_delay_(audio_dsp::GammaFilterDelay(kNoiseSmootherOrder, noise_smoother_.pole())) {
   CHECK(num_chunks_ > 0);
   CHECK(detection_num_frames_ >= 1);
   CHECK(detection_num_shifts_ >= frame_size_);
-  DesignNoiseSmoother(smoothing_width, &noise_delay_, &noise_alpha_);
   warmup_frames_ = std::max(noise_delay_, 10);
   // The history holds the frames read back: the delayed frame (N + 1), the
   // warm-up, and the detection window's oldest frame, W + 1 - F back. One
@@ -440,12 +442,10 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
     for (int k = 0; k < warmup_frames_; ++k) {
       sum += Eigen::Map<const FloatVector>(HistoryRow(first_frame_ + k), num_frequencies_).sum();
     }
-    noise_level_1_ = noise_level_2_ =
-        sum / static_cast<float>(num_frequencies_ * warmup_frames_);
+    noise_level_ = sum / static_cast<float>(num_frequencies_ * warmup_frames_);
+    noise_smoother_.SetState(noise_level_);
   } else if (age > warmup_frames_ - 1) {
-    const float x = power_sum / static_cast<float>(num_frequencies_);
-    noise_level_1_ += noise_alpha_ * (x - noise_level_1_);
-    noise_level_2_ += noise_alpha_ * (noise_level_1_ - noise_level_2_);
+    noise_level_ = noise_smoother_.ProcessSample(power_sum / static_cast<float>(num_frequencies_));
   }
   if (age >= warmup_frames_ - 1) {
     const float* delayed = HistoryRow(n - noise_delay_);
@@ -459,7 +459,7 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
     }
     for (; k < num_frequencies_; ++k) m0 = std::max(m0, delayed[k]);
     const float peak = std::max(std::max(m0, m1), std::max(m2, m3));
-    score = peak / (noise_level_2_ + 1e-12f);
+    score = peak / (noise_level_ + 1e-12f);
   }
   ++frame_counter_;
   return score;

@@ -7,8 +7,8 @@
 // frame) with the phasors exp(+j c 2 pi f_i / num_chunks):
 //   p_n[i] = | sum_c phasor[i][c] corr_c(n) |^2.
 // The acquisition score of frame n is max_i p_n[i] over a noise level, the
-// mean of p over frequencies smoothed by two one-pole stages; the smoother
-// delay N is compensated, so the score of frame n is emitted N frames later.
+// mean of p over frequencies smoothed by a two-stage gamma filter; the
+// smoother's delay N is compensated, so the score of frame n is emitted N frames later.
 // The detection score integrates p non-coherently over whole code periods
 // in a detection window and normalises the best bin by the total power.
 //
@@ -21,6 +21,7 @@
 #include <vector>
 
 #include "audio/dsp/eigen_types.h"
+#include "audio/dsp/gamma_filter.h"
 
 namespace audio_sorvane {
 
@@ -34,7 +35,8 @@ class AcquisitionScorer {
  public:
   // `code_template`: one baseband frame of the code (F samples);
   // `frequency_offsets` in carrier cycles per frame; `detection_window` in
-  // baseband samples; `smoothing_width` sets the noise smoother's spread.
+  // baseband samples; `smoothing_width` (> 0, frames) sets the noise
+  // smoother's spread.
   AcquisitionScorer(std::span<const float> code_template,
                     std::span<const float> frequency_offsets, int num_chunks,
                     int detection_window, float smoothing_width,
@@ -60,7 +62,7 @@ class AcquisitionScorer {
 
   int frame_size() const { return frame_size_; }
   int noise_delay() const { return noise_delay_; }
-  float noise_alpha() const { return noise_alpha_; }
+  float noise_alpha() const { return noise_smoother_.gain(); }
   // The number of the next frame: frames scored since Reset plus its first_frame.
   int64_t frame_counter() const { return frame_counter_; }
   int detection_window_size() const { return detection_window_size_; }
@@ -127,10 +129,9 @@ class AcquisitionScorer {
   std::vector<float> batch_powers_;      // 8 frames per frequency
   std::vector<float> matrix_real_;       // the phasors by frequency
   std::vector<float> matrix_imaginary_;
+  audio_dsp::GammaFilter noise_smoother_;  // one sample per frame
   int noise_delay_;
-  float noise_alpha_;
-  float noise_level_1_ = 0.0f;
-  float noise_level_2_ = 0.0f;
+  float noise_level_ = 0.0f;  // the smoother's latest output
   int warmup_frames_;
   // Frequency powers of the recent frames: row (frame & (rows - 1)).
   int history_rows_ = 0;

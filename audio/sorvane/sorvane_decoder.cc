@@ -5,8 +5,10 @@
 #include <numbers>
 #include <utility>
 
+#include "audio/dsp/acoustics.h"
 #include "audio/dsp/box_filter.h"
 #include "audio/dsp/float4.h"
+#include "audio/dsp/lowpass_design.h"
 #include "audio/dsp/number_util.h"
 #include "audio/dsp/resampler.h"
 #include "audio/sorvane/compute_buffer_truncation.h"
@@ -19,8 +21,8 @@ namespace {
 
 using audio_dsp::ComplexVector;
 using audio_dsp::FloatVector;
+using audio_dsp::kSpeedOfSound;
 
-constexpr double kSpeedOfSound = 340.0;  // m/s
 constexpr double kMaxSavedSeconds = 30.0;
 
 }  // namespace
@@ -51,7 +53,7 @@ SorvaneDecoder::SorvaneDecoder(std::shared_ptr<const SymbolWaveCoder> symbol_wav
   const int x = static_cast<int>(std::ceil(params_.frame_extension * frame_size_));
   extended_size_ = audio_dsp::RoundUpToMultiple(frame_size_ + 2 * x, phase_block_size_);
   extension_ = (extended_size_ - frame_size_) / 2;
-  PeriodicPad<float>(coder_->baseband_code(), extension_,
+  audio_dsp::PeriodicPad<float>(coder_->baseband_code(), extension_,
                      extended_size_ - frame_size_ - extension_, &extended_code_);
   extended_window_.resize(extended_size_);
   for (int i = 0; i < extended_size_; ++i) {
@@ -62,7 +64,7 @@ SorvaneDecoder::SorvaneDecoder(std::shared_ptr<const SymbolWaveCoder> symbol_wav
                -2.0 * std::numbers::pi / (frame_size_ / phase_block_size_), &symbol_phasors_);
 
   if (params_.use_designed_lowpass) {
-    smoothing_filter_ = std::make_unique<audio_dsp::ComplexFirFilter>(DesignLowpassTaps(
+    smoothing_filter_ = std::make_unique<audio_dsp::ComplexFirFilter>(audio_dsp::DesignLowpassTaps(
         params_.lowpass_num_taps, params_.lowpass_cutoff,
         static_cast<float>(coder_params.upsampling_factor /
                            coder_params.baseband_decimation_factor)));
@@ -100,8 +102,10 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
   sample_rate_ = sample_rate;
   const float coder_rate = coder_->params().sample_rate;
   max_buffer_size_ = static_cast<int>(std::lround(params_.buffer_duration * sample_rate));
+  // Frame duration times frames times rate, in this order: GetMaxSafeInputSize
+  // reports the rounded result.
   const int frames_per_token =
-      params_.symbols_in_token + (params_.append_check_symbol ? 1 : 0) + 1;
+      FramesPerToken(params_.symbols_in_token, params_.append_check_symbol);
   max_good_block_size_ = static_cast<int>(std::lround(
       coder_->samples_per_frame() / coder_rate * frames_per_token * sample_rate));
   input_per_baseband_ = static_cast<double>(sample_rate) / baseband_rate_;
@@ -115,7 +119,8 @@ void SorvaneDecoder::Initialize(int num_channels, float sample_rate) {
   mix_step_ = {std::cos(omega * kMixLanes), std::sin(omega * kMixLanes)};
   oscillator_ = {1.0, 0.0};
   baseband_resampler_ = std::make_unique<audio_dsp::RationalFactorResampler<std::complex<float>>>(
-      audio_dsp::DefaultResamplingKernel(sample_rate, baseband_rate_), 2000);
+      audio_dsp::DefaultResamplingKernel(sample_rate, baseband_rate_),
+      audio_dsp::kDefaultMaxDenominator);
   CHECK(baseband_resampler_->Valid()) << "Failed to initialize RationalFactorResampler.";
 
   smoothing_filter_->Reset();
@@ -180,21 +185,17 @@ void SorvaneDecoder::ProcessSamples(std::span<const float> received_samples) {
     LOG(ERROR) << "ProcessSamples() called before call to Initialize().";
     return;
   }
-  const int input_size = static_cast<int>(received_samples.size()) / num_channels_;
-  const int buffered_size = static_cast<int>(
-      std::ceil(input_per_baseband_ * (acquisition_scores_.size() + 1)));
-  const BufferTruncation truncation = ComputeBufferTruncation(
-      input_size, buffered_size, max_good_block_size_, max_buffer_size_);
-  const int skip = truncation.skip * num_channels_;
-  const int drop = static_cast<int>(std::ceil(truncation.drop / input_per_baseband_));
+  const BlockTruncation truncation = ComputeBlockTruncation(
+      static_cast<int>(received_samples.size()), num_channels_, input_per_baseband_,
+      acquisition_scores_.size(), frame_size_, max_good_block_size_, max_buffer_size_);
+  const int skip = truncation.skip_samples;
   if (skip >= 1) {
     ResetStream();
     Initialize(num_channels_, sample_rate_);
     received_samples = received_samples.subspan(
         std::min<size_t>(static_cast<size_t>(skip), received_samples.size()));
-  } else if (drop >= 1) {
-    const int d = std::min(audio_dsp::RoundUpToMultiple(drop, frame_size_),
-                           acquisition_scores_.size());
+  } else if (truncation.drop_baseband >= 1) {
+    const int d = truncation.drop_baseband;
     num_scored_ -= d;
     baseband_real_.Discard(d);
     baseband_imaginary_.Discard(d);

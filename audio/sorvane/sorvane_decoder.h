@@ -30,6 +30,7 @@
 #include "audio/dsp/rational_factor_resampler.h"
 #include "audio/dsp/signal_vector_util.h"
 #include "audio/sorvane/acquisition_scorer.h"
+#include "audio/sorvane/decode_results.h"
 #include "audio/sorvane/decoding_group.h"
 #include "audio/sorvane/multipath_scorer.h"
 #include "audio/sorvane/stream_buffer.h"
@@ -74,30 +75,6 @@ struct SorvaneDecoderParams {
   int max_candidates_to_return = 2;
 };
 
-// What one token request returns.
-struct DecodeResults {
-  std::vector<DecodedToken> tokens;
-  // Diagnostics: the chosen group's detection times (s) and filtered scores.
-  std::vector<float> detection_times;
-  std::vector<float> detection_scores;
-  SymbolScoreMap symbol_scores;
-  audio_dsp::FloatMatrix scores_table;
-
-  // Empties everything, keeping allocated capacity for the next request.
-  void Clear() {
-    tokens.clear();
-    scores_table.resize(0, 0);
-    ClearDiagnostics();
-  }
-  // Empties the detections and symbol scores, leaving the candidates and the
-  // table for the token selector to overwrite in place.
-  void ClearDiagnostics() {
-    detection_times.clear();
-    detection_scores.clear();
-    symbol_scores.clear();
-  }
-};
-
 class SorvaneDecoder {
  public:
   SorvaneDecoder(std::shared_ptr<const SymbolWaveCoder> symbol_wave_coder,
@@ -123,6 +100,11 @@ class SorvaneDecoder {
   int GetMaxSafeInputSize() const;
 
   const SymbolWaveCoder& symbol_wave_coder() const { return *coder_; }
+  // Bytes the data symbols of one token carry: bits_per_symbol *
+  // symbols_in_token / 8.
+  int token_length_bytes() const {
+    return coder_->params().bits_per_symbol * params_.symbols_in_token / 8;
+  }
   const SorvaneDecoderParams& params() const { return params_; }
   bool initialized() const { return initialized_; }
   // Buffer occupancy, for bounds checks and diagnostics.

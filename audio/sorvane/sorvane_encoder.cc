@@ -73,6 +73,24 @@ bool SorvaneEncoder::EncodeSymbols(const std::vector<int>& symbols,
   return true;
 }
 
+namespace {
+
+// Logs and refuses an empty input or a null output of a transition call.
+bool TransitionArgumentsValid(const char* caller, std::span<const float> input,
+                              const std::vector<float>* output) {
+  if (input.empty()) {
+    LOG(ERROR) << caller << "() called with empty input.";
+    return false;
+  }
+  if (output == nullptr) {
+    LOG(ERROR) << caller << "() called with null output pointer.";
+    return false;
+  }
+  return true;
+}
+
+}  // namespace
+
 int SorvaneEncoder::TransitionLength() const {
   return std::max(0, static_cast<int>(std::lround(params_.broadcast_sample_rate *
                                                   params_.transition_duration)));
@@ -80,14 +98,7 @@ int SorvaneEncoder::TransitionLength() const {
 
 bool SorvaneEncoder::MakeStartTransition(std::span<const float> input,
                                          std::vector<float>* output) const {
-  if (input.empty()) {
-    LOG(ERROR) << "MakeStartTransition() called with empty input.";
-    return false;
-  }
-  if (output == nullptr) {
-    LOG(ERROR) << "MakeStartTransition() called with null output pointer.";
-    return false;
-  }
+  if (!TransitionArgumentsValid("MakeStartTransition", input, output)) return false;
   const int n = TransitionLength();
   const int length = static_cast<int>(input.size());
   output->resize(n);
@@ -102,14 +113,7 @@ bool SorvaneEncoder::MakeStartTransition(std::span<const float> input,
 
 bool SorvaneEncoder::MakeStopTransition(std::span<const float> input,
                                         std::vector<float>* output) const {
-  if (input.empty()) {
-    LOG(ERROR) << "MakeStopTransition() called with empty input.";
-    return false;
-  }
-  if (output == nullptr) {
-    LOG(ERROR) << "MakeStopTransition() called with null output pointer.";
-    return false;
-  }
+  if (!TransitionArgumentsValid("MakeStopTransition", input, output)) return false;
   const int n = TransitionLength();
   const int length = static_cast<int>(input.size());
   output->resize(n);

@@ -1,6 +1,5 @@
-// Vector helpers of the receivers: Doppler frequency grids, phasor matrices,
-// peak search over a bank of correlators, periodic padding and the complex
-// low-pass design of the baseband smoother.
+// Phasor helpers of the receivers: Doppler frequency grids, phasor matrices
+// and the peak search over a bank of correlators.
 //
 // Stateless. Null outputs and the listed size mismatches end the process
 // through CHECK.
@@ -37,33 +36,6 @@ struct FilterResponsePeak {
 FilterResponsePeak MaxFilterResponse(
     const audio_dsp::ComplexMatrix& filter_matrix,
     const audio_dsp::ComplexVector& signal);
-
-// `signal` repeated cyclically: pad_before + signal.size() + pad_after
-// values, value i = signal[(i - pad_before) mod signal.size()].
-template <typename T>
-void PeriodicPad(std::span<const T> signal, int pad_before, int pad_after,
-                 std::vector<T>* padded_signal) {
-  CHECK(!signal.empty());
-  CHECK(padded_signal);
-  const int n = static_cast<int>(signal.size());
-  padded_signal->resize(pad_before + n + pad_after);
-  // Start at the index of value 0 and walk forward without a per-value
-  // division.
-  int j = ((-pad_before) % n + n) % n;
-  for (T& value : *padded_signal) {
-    value = signal[j];
-    if (++j == n) j = 0;
-  }
-}
-
-// Complex FIR taps (num_taps, odd counts centred on 0) of a one-sided
-// low-pass: gain 1 from -cutoff up to cutoff + 0.5 / oversampling, a
-// quarter-cosine roll-off up to half the rate, nothing below -cutoff.
-// Frequencies are normalised to the sample rate. Sampled on 1024 bins,
-// transformed by the inverse FFT (normalised, so the DC gain is about 1) and
-// cosine-windowed.
-std::vector<std::complex<float>> DesignLowpassTaps(int num_taps, float cutoff,
-                                                   float oversampling);
 
 }  // namespace audio_sorvane
 

@@ -61,35 +61,6 @@ TEST(MaxFilterResponseTest, PicksStrongestRowFirstOnTies) {
   EXPECT_EQ(empty.power, 0.0f);
 }
 
-TEST(PeriodicPadTest, RepeatsSignalCyclically) {
-  const std::vector<int> signal = {1, 2, 3};
-  std::vector<int> padded;
-  PeriodicPad<int>(signal, 2, 1, &padded);
-  EXPECT_THAT(padded, ElementsAre(2, 3, 1, 2, 3, 1));
-  PeriodicPad<int>(signal, 7, 0, &padded);
-  EXPECT_THAT(padded, ElementsAre(3, 1, 2, 3, 1, 2, 3, 1, 2, 3));
-  PeriodicPad<int>(signal, 0, 0, &padded);
-  EXPECT_EQ(padded, signal);
-}
-
-// The frequency response of the designed taps: unit gain inside the one-sided
-// passband, strong rejection below -cutoff.
-TEST(DesignLowpassTapsTest, OneSidedPassband) {
-  const std::vector<Complex> taps = DesignLowpassTaps(31, 0.05f, 4.0f);
-  ASSERT_EQ(taps.size(), 31u);
-  const auto gain = [&](double nu) {
-    std::complex<double> sum;
-    for (int j = -15; j <= 15; ++j) {
-      sum += std::complex<double>(taps[j + 15]) *
-             std::polar(1.0, -2.0 * std::numbers::pi * nu * j);
-    }
-    return std::abs(sum);
-  };
-  for (double nu : {-0.02, 0.0, 0.05, 0.15}) EXPECT_NEAR(gain(nu), 1.0, 0.05) << nu;
-  for (double nu : {-0.2, -0.3, -0.45}) EXPECT_LT(gain(nu), 0.02) << nu;
-  EXPECT_EQ(DesignLowpassTaps(4, 0.05f, 4.0f).size(), 3u);  // centred: odd
-}
-
 #if GTEST_HAS_DEATH_TEST
 TEST(SorvaneUtilDeathTest, RejectsInvalidArguments) {
   std::vector<float> grid;
@@ -98,10 +69,6 @@ TEST(SorvaneUtilDeathTest, RejectsInvalidArguments) {
   EXPECT_DEATH(MaxFilterResponse(audio_dsp::ComplexMatrix(2, 3),
                                  audio_dsp::ComplexVector(2)),
                CheckFailed("filter_matrix.cols() == signal.size()"));
-  std::vector<float> padded;
-  EXPECT_DEATH(PeriodicPad<float>({}, 1, 1, &padded), CheckFailed("!signal.empty()"));
-  EXPECT_DEATH(PeriodicPad<float>(grid = {1.0f}, 1, 1, nullptr),
-               CheckFailed("padded_signal"));
 }
 #endif
 

@@ -27,7 +27,7 @@ TokenSelector::TokenSelector(const TokenSelectorParams& params) : params_(params
   CHECK(params_.max_candidates_to_consider >= params_.max_candidates_rank);
   CHECK(params_.max_candidates_rank >= params_.max_candidates_to_return);
   CHECK(params_.token_threshold_factor >= 0);
-  symbol_period_ = params_.symbols_in_token + (params_.append_check_symbol ? 1 : 0) + 1;
+  symbol_period_ = FramesPerToken(params_.symbols_in_token, params_.append_check_symbol);
   scratch_.top = audio_dsp::BatchTopN<int>(params_.max_candidates_rank);
   // Scratch at its largest sizes, so selections never grow it.
   scratch_.runners_up.reserve(static_cast<size_t>(params_.alphabet_size) * symbol_period_);

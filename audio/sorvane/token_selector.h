@@ -23,6 +23,7 @@
 
 #include "audio/dsp/batch_top_n.h"
 #include "audio/dsp/eigen_types.h"
+#include "audio/sorvane/decode_results.h"
 #include "audio/sorvane/symbol_score_map.h"
 
 namespace audio_sorvane {
@@ -33,13 +34,18 @@ namespace audio_sorvane {
 // data symbol, never the spacer. Requires alphabet_size >= 2.
 int ComputeCheckSymbol(int alphabet_size, std::span<const int> symbols);
 
-// A token candidate.
-struct DecodedToken {
-  std::vector<int> symbols;    // data symbols, from right after the spacer
-  float score = 0.0f;          // summed normalised scores
-  std::vector<uint8_t> bytes;  // filled by the receivers
-  int position = 0;            // where the candidate's spacer was observed
-};
+// Symbol frames one token takes on the air, its period in a loop: the data
+// symbols, the check symbol if there is one, and the spacer.
+constexpr int FramesPerToken(int symbols_in_token, bool append_check_symbol) {
+  return symbols_in_token + (append_check_symbol ? 1 : 0) + 1;
+}
+
+// Seconds one token lasts on the air: `frames_per_token` frames of
+// `samples_per_frame` samples at `sample_rate` Hz.
+inline float TokenDurationSeconds(int frames_per_token, int samples_per_frame,
+                                  float sample_rate) {
+  return static_cast<float>(frames_per_token * samples_per_frame) / sample_rate;
+}
 
 struct TokenSelectorParams {
   int alphabet_size = 17;  // symbols including the spacer

@@ -5,6 +5,7 @@
 #include <complex>
 #include <numbers>
 
+#include "audio/dsp/acoustics.h"
 #include "audio/dsp/float4.h"
 #include "audio/dsp/gamma_filter.h"
 #include "audio/dsp/number_util.h"
@@ -20,9 +21,12 @@ using audio_dsp::Load8;
 using audio_dsp::Max8;
 using audio_dsp::Min8;
 using audio_dsp::Splat8;
+using audio_dsp::kSpeedOfSound;
 using audio_dsp::Store8;
 
-constexpr double kSpeedOfSound = 340.0;  // m/s
+// Half the 3 dB bandwidth of a half-sine window of T seconds is 0.594 / T Hz
+// (|W(f)|^2 falls to half at f = 0.5945 / T).
+constexpr double kHalfSineHalfBandwidthCycles = 0.594;
 
 TokenSelectorParams SelectorParams(const DtmfDecoderParams& params, int symbols_in_token) {
   TokenSelectorParams selector;
@@ -69,13 +73,13 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
   baseband_sample_rate_ =
       params_.sample_rate / static_cast<float>(params_.baseband_decimation_factor);
 
-  // Tone filter bandwidth: the largest Doppler shift plus the bandwidth of
-  // one symbol frame.
+  // Tone filter bandwidth: the largest Doppler shift plus half the 3 dB
+  // bandwidth of one (half-sine windowed) symbol frame.
   const float highest = *std::max_element(params_.tone_frequencies.begin(),
                                           params_.tone_frequencies.end());
   const double cutoff = static_cast<double>(highest * params_.max_meters_per_second) /
                             kSpeedOfSound +
-                        0.594 / frame_duration_;
+                        kHalfSineHalfBandwidthCycles / frame_duration_;
   tone_bank_ = std::make_unique<ToneFilterBank>(params_.baseband_decimation_factor,
                                                 params_.sample_rate, params_.tone_frequencies,
                                                 cutoff, params_.use_reference_paths);
@@ -93,7 +97,7 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
   const RoomSearchParams& room = params_.room_search;
   ToneSequenceSearchParams search;
   search.num_tones = num_frequencies_;
-  search.period = converter_.symbols_in_token() + (params_.use_checksum_symbol ? 1 : 0) + 1;
+  search.period = token_selector_->symbol_period();
   search.tones_per_symbol = params_.tones_per_symbol;
   search.num_taps = room.num_taps;
   search.masks_per_tone = room.masks_per_tone;
@@ -275,7 +279,7 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
   received_sample_rate_ = received_sample_rate;
   num_channels_ = num_channels;
   received_per_baseband_ = received_sample_rate_ / baseband_sample_rate_;
-  const int frames = converter_.symbols_in_token() + (params_.use_checksum_symbol ? 1 : 0) + 1;
+  const int frames = token_selector_->symbol_period();
   max_good_block_size_ =
       static_cast<int>(std::lround(frame_duration_ * received_sample_rate_ * frames));
   max_buffer_size_ = static_cast<int>(
@@ -284,7 +288,8 @@ void DtmfDecoder::Init(int num_channels, float received_sample_rate) {
     received_resampler_.reset();
   } else {
     received_resampler_ = std::make_unique<audio_dsp::RationalFactorResampler<float>>(
-        audio_dsp::DefaultResamplingKernel(received_sample_rate_, params_.sample_rate), 2000);
+        audio_dsp::DefaultResamplingKernel(received_sample_rate_, params_.sample_rate),
+        audio_dsp::kDefaultMaxDenominator);
     CHECK(received_resampler_->Valid()) << "Failed to initialize RationalFactorResampler.";
   }
   tone_strength_buffer_size_ = 0;
@@ -335,24 +340,19 @@ void DtmfDecoder::ProcessSamples(std::span<const float> received_samples) {
     return;
   }
   if (received_samples.empty()) return;
-  const int frames = static_cast<int>(received_samples.size()) / num_channels_;
-  const int buffered = static_cast<int>(
-      std::ceil(received_per_baseband_ * (tone_strength_buffer_size_ + 1)));
-  const BufferTruncation truncation =
-      ComputeBufferTruncation(frames, buffered, max_good_block_size_, max_buffer_size_);
-  const int skip_samples = truncation.skip * num_channels_;
-  const int drop_baseband =
-      static_cast<int>(std::ceil(truncation.drop / received_per_baseband_));
+  // Drops whole symbol periods, so the symbol phase of the buffers is kept.
+  const BlockTruncation truncation = ComputeBlockTruncation(
+      static_cast<int>(received_samples.size()), num_channels_, received_per_baseband_,
+      tone_strength_buffer_size_, baseband_frame_size_, max_good_block_size_, max_buffer_size_);
+  const int skip_samples = truncation.skip_samples;
   if (skip_samples >= 1) {
     Init(num_channels_, received_sample_rate_);
     ProcessSamples(received_samples.subspan(
         std::min<size_t>(static_cast<size_t>(skip_samples), received_samples.size())));
     return;
   }
-  if (drop_baseband >= 1) {
-    // Whole symbol periods, so the symbol phase of the buffers is kept.
-    const int drop = std::min(audio_dsp::RoundUpToMultiple(drop_baseband, baseband_frame_size_),
-                              tone_strength_buffer_size_);
+  if (truncation.drop_baseband >= 1) {
+    const int drop = truncation.drop_baseband;
     begin_ += drop;
     tone_strength_buffer_size_ -= drop;
   }

@@ -26,13 +26,12 @@
 #include "audio/dsp/eigen_types.h"
 #include "audio/dsp/float4.h"
 #include "audio/dsp/rational_factor_resampler.h"
+#include "audio/sorvane/decode_results.h"
 #include "audio/sorvane/dtmf/byte_symbol_converter.h"
 #include "audio/sorvane/dtmf/dtmf_encoder_params.h"
 #include "audio/sorvane/dtmf/noise_smoother.h"
 #include "audio/sorvane/dtmf/tone_sequence_search.h"
 #include "audio/sorvane/dtmf/tone_strength_filter.h"
-#include "audio/sorvane/sorvane_decoder.h"
-
 #include "audio/sorvane/token_selector.h"
 
 namespace audio_sorvane {

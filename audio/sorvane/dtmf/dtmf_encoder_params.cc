@@ -5,6 +5,7 @@
 
 #include "audio/dsp/number_util.h"
 #include "audio/sorvane/dtmf/byte_symbol_converter.h"
+#include "audio/sorvane/token_selector.h"
 #include "base/logging.h"
 
 namespace audio_sorvane {
@@ -49,8 +50,8 @@ int SymbolsInToken(const DtmfEncoderParams& params) {
 }
 
 float TokenDurationSeconds(const DtmfEncoderParams& params) {
-  const int frames = SymbolsInToken(params) + (params.use_checksum_symbol ? 2 : 1);
-  return static_cast<float>(frames * FrameSize(params)) / params.sample_rate;
+  return TokenDurationSeconds(FramesPerToken(SymbolsInToken(params), params.use_checksum_symbol),
+                              FrameSize(params), params.sample_rate);
 }
 
 void SetToneFrequencies(const std::vector<float>& frequencies,

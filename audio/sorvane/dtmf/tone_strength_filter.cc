@@ -84,6 +84,17 @@ void ToneStrengthFilter::ProcessSamples(std::span<const float> input,
   ProcessSamples(input, output_samples, nullptr);
 }
 
+void ToneStrengthFilter::PrepareOutputs(size_t input_size, std::vector<float>* output_samples,
+                                        std::vector<std::complex<float>>* block_sums) const {
+  CHECK(output_samples);
+  output_samples->clear();
+  output_samples->reserve(input_size / decimation_factor_ + 1);
+  if (block_sums) {
+    block_sums->clear();
+    block_sums->reserve(input_size / decimation_factor_ + 1);
+  }
+}
+
 // The fast path: the block sum is accumulated in the frame of the block's
 // first sample (acc = sum x[n] e^{i n omega}) and turned by the oscillator
 // phase at the block start when the block completes. The register phase_
@@ -92,13 +103,7 @@ void ToneStrengthFilter::ProcessSamples(std::span<const float> input,
 void ToneStrengthFilter::ProcessSamples(std::span<const float> input,
                                         std::vector<float>* output_samples,
                                         std::vector<std::complex<float>>* block_sums) {
-  CHECK(output_samples);
-  output_samples->clear();
-  output_samples->reserve(input.size() / decimation_factor_ + 1);
-  if (block_sums) {
-    block_sums->clear();
-    block_sums->reserve(input.size() / decimation_factor_ + 1);
-  }
+  PrepareOutputs(input.size(), output_samples, block_sums);
   const int d = decimation_factor_;
   uint32_t block_phase =
       phase_ - static_cast<uint32_t>(d - countdown_) * phase_increment_ - (1u << 19);
@@ -136,13 +141,7 @@ void ToneStrengthFilter::ProcessSamples(std::span<const float> input,
 void ToneStrengthFilter::ProcessSamplesReference(std::span<const float> input,
                                                  std::vector<float>* output_samples,
                                                  std::vector<std::complex<float>>* block_sums) {
-  CHECK(output_samples);
-  output_samples->clear();
-  output_samples->reserve(input.size() / decimation_factor_ + 1);
-  if (block_sums) {
-    block_sums->clear();
-    block_sums->reserve(input.size() / decimation_factor_ + 1);
-  }
+  PrepareOutputs(input.size(), output_samples, block_sums);
   // Locals let the compiler keep the loop state in registers.
   uint32_t phase = phase_;
   float acc_re = accumulator_.real();

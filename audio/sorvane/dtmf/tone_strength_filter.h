@@ -74,6 +74,10 @@ class ToneStrengthFilter {
   float smoothing_gain() const { return smoothing_gain_; }
 
  private:
+  // Empties the outputs (block_sums may be null) and reserves room for the
+  // outputs of `input_size` samples. A null output_samples is fatal.
+  void PrepareOutputs(size_t input_size, std::vector<float>* output_samples,
+                      std::vector<std::complex<float>>* block_sums) const;
   friend class ToneFilterBank;
 
   const float* table_;
