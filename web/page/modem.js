@@ -8,6 +8,9 @@ import createSorvelModule from './sorvel_web.js';
 export function instantiateModem(wasmModule) {
   return new Promise((resolve, reject) => {
     createSorvelModule({
+      // Without it the factory resolves the .wasm path with URL, which the
+      // AudioWorklet's scope lacks; the path is never fetched.
+      locateFile: (path) => path,
       instantiateWasm(imports, receiveInstance) {
         WebAssembly.instantiate(wasmModule, imports)
             .then((instance) => receiveInstance(instance), reject);
