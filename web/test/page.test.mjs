@@ -114,6 +114,15 @@ test('the page decodes the token its microphone hears', {timeout: 2 * DECODE_TIM
   assert.match(await text('#tokens li:first-child'), /dsss, CRC passed, after wake-up/);
   await page.click('#hotsound');
   await page.screenshot({path: path.join(out, 'web-page.png'), fullPage: true});
+
+  // Stopping closes the worklet's decoder; listening again starts a new one.
+  await page.click('#stop-listen');
+  assert.equal(await text('#listen-info'), 'Stopped.');
+  await page.click('#start-listen');
+  await page.waitForFunction(
+      () => /^Listening at \d+ Hz for dsss with CRC\.$/.test(document.getElementById('listen-info').textContent),
+      {timeout: 10000});
+  assert.equal(await visible('#listen-error'), false);
 });
 
 test('bad settings show a message and leave the page working', async () => {
