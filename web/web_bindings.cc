@@ -109,7 +109,10 @@ class JsDecoder {
       LOG(ERROR) << "process takes a Float32Array; block dropped";
       return heard;
     }
-    samples_ = emscripten::convertJSArrayToNumberVector<float>(block);
+    // Copied into a buffer that keeps its capacity: the AudioWorklet calls
+    // this every render quantum, so the steady state allocates nothing.
+    samples_.resize(block["length"].as<size_t>());
+    val(emscripten::typed_memory_view(samples_.size(), samples_.data())).call<void>("set", block);
     for (const std::string& token : decoder_.Process(samples_)) heard.call<void>("push", token);
     return heard;
   }

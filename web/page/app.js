@@ -1,7 +1,8 @@
 // The page: encodes a token and plays it through WebAudio, and listens
-// through the microphone, feeding the WebAssembly decoder on the main thread
-// with blocks an AudioWorklet collects at the AudioContext's own rate.
-'use strict';
+// through the microphone with the WebAssembly decoder running in an
+// AudioWorklet (decoder_worklet.js), at the AudioContext's own rate, off the
+// main thread. The module is compiled once here; the page's instance encodes.
+import {compileModem, instantiateModem} from './modem.js';
 
 const $ = (id) => document.getElementById(id);
 
@@ -10,10 +11,13 @@ const BAND_LOW_HZ = 16000;
 const BAND_HIGH_HZ = 20000;
 const METER_FLOOR_DB = -120;
 
-let modem = null;     // the WebAssembly module
+let wasmModule = null;  // the compiled WebAssembly.Module, shared with the worklet
+let modem = null;     // the page's instance of it
 let context = null;   // one AudioContext for playing and listening
 let player = null;    // the AudioBufferSourceNode playing, if any
-let listening = null; // {stream, source, worklet, analyser, decoder, settings}
+// {stream, source, worklet, analyser, settings (those of the decoder that
+// listens), requested (settings sent, awaiting their answer)}
+let listening = null;
 
 // The sender's settings; the receiver adds the wake-up gate.
 function settings() {
@@ -45,7 +49,7 @@ function updateHint() {
 async function audioContext() {
   if (!context) {
     context = new AudioContext();
-    await context.audioWorklet.addModule('capture_worklet.js');
+    await context.audioWorklet.addModule('decoder_worklet.js');
   }
   if (context.state === 'suspended') await context.resume();
   return context;
@@ -94,18 +98,42 @@ function stopPlaying() {
   $('stop-play').disabled = true;
 }
 
-// Builds or rebuilds the decoder for the current settings; a refused change
-// keeps the decoder that was listening.
+// Asks the worklet to build or rebuild the decoder for the current settings;
+// its answer comes in onDecoderMessage.
 function configureDecoder() {
   if (!listening) return;
   const s = receiverSettings();
-  const error = listening.decoder.configure(s);
-  showError('listen-error', error);
-  if (!error) {
-    listening.settings = s;
-    $('listen-info').textContent =
-        `Listening at ${s.sampleRateHz} Hz for ${s.scheme}${s.crc ? ' with CRC' : ''}` +
-        `${s.hotsound ? ' after the wake-up detector' : ''}.`;
+  listening.requested.push(s);
+  listening.worklet.port.postMessage({type: 'configure', settings: s});
+}
+
+// The worklet's answers arrive in the order of the requests. A refused
+// change keeps the decoder that was listening.
+function onDecoderMessage(event) {
+  if (!listening) return;
+  const message = event.data;
+  switch (message.type) {
+    case 'configured': {
+      const s = listening.requested.shift();
+      showError('listen-error', message.error);
+      if (!message.error) {
+        listening.settings = s;
+        $('listen-info').textContent =
+            `Listening at ${s.sampleRateHz} Hz for ${s.scheme}${s.crc ? ' with CRC' : ''}` +
+            `${s.hotsound ? ' after the wake-up detector' : ''}.`;
+      }
+      break;
+    }
+    case 'tokens':
+      for (const token of message.tokens) addToken(token);
+      break;
+    case 'failed':
+      stopListening();
+      showError('listen-error', `The decoder did not load: ${message.message}`);
+      break;
+    case 'error':
+      showError('listen-error', message.message);
+      break;
   }
 }
 
@@ -122,24 +150,29 @@ async function startListening() {
     showError('listen-error', `No microphone: ${e.message}`);
     return;
   }
+  let worklet;
+  try {
+    worklet = new AudioWorkletNode(ctx, 'sorvel-decoder',
+                                   {numberOfOutputs: 0, processorOptions: {wasmModule}});
+  } catch (e) {
+    stream.getTracks().forEach((track) => track.stop());
+    showError('listen-error', `No decoder: ${e.message}`);
+    return;
+  }
   const source = ctx.createMediaStreamSource(stream);
-  const worklet = new AudioWorkletNode(ctx, 'sorvel-capture', {numberOfOutputs: 0});
   const analyser = ctx.createAnalyser();
   analyser.fftSize = 2048;
   analyser.smoothingTimeConstant = 0.6;
   source.connect(worklet);
   source.connect(analyser);
-  listening = {stream, source, worklet, analyser, decoder: new modem.Decoder()};
-  configureDecoder();
-  const scaled = new Float32Array(2048);
-  worklet.port.onmessage = (event) => {
-    if (!listening) return;
-    const block = event.data;
-    // The decoder takes samples on the 16-bit scale.
-    const input = block.length === scaled.length ? scaled : new Float32Array(block.length);
-    for (let i = 0; i < block.length; ++i) input[i] = block[i] * 32768;
-    for (const token of listening.decoder.process(input)) addToken(token);
+  listening = {stream, source, worklet, analyser, settings: null, requested: []};
+  worklet.port.onmessage = onDecoderMessage;
+  worklet.onprocessorerror = () => {
+    stopListening();
+    showError('listen-error', 'The decoder stopped with an error.');
   };
+  $('listen-info').textContent = 'Starting the decoder…';
+  configureDecoder();
   $('start-listen').disabled = true;
   $('stop-listen').disabled = false;
   requestAnimationFrame(drawLevel);
@@ -148,9 +181,9 @@ async function startListening() {
 function stopListening() {
   if (!listening) return;
   listening.worklet.port.onmessage = null;
+  listening.worklet.port.postMessage({type: 'close'});
   listening.source.disconnect();
   listening.stream.getTracks().forEach((track) => track.stop());
-  listening.decoder.delete();
   listening = null;
   $('start-listen').disabled = false;
   $('stop-listen').disabled = true;
@@ -225,8 +258,9 @@ function onSettingsChanged() {
   configureDecoder();
 }
 
-createSorvelModule().then((module) => {
-  modem = module;
+compileModem().then(async (compiled) => {
+  wasmModule = compiled;
+  modem = await instantiateModem(wasmModule);
   $('play').addEventListener('click', play);
   $('stop-play').addEventListener('click', stopPlaying);
   $('start-listen').addEventListener('click', startListening);

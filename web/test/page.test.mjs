@@ -1,6 +1,7 @@
 // Opens the built page in headless Chromium whose fake microphone plays a
 // looped broadcast that `sorvel encode` wrote, and checks that the page
-// decodes the token and answers bad settings with a message.
+// decodes the token in its AudioWorklet and answers bad settings with a
+// message.
 //
 //   SORVEL_WEB_DIST  the built page (default build-web/dist)
 //   SORVEL_BIN       the host `sorvel` tool (default build/tools/sorvel)
@@ -104,7 +105,8 @@ test('the page decodes the token its microphone hears', {timeout: 2 * DECODE_TIM
 
   // Behind the wake-up detector: a rebuilt decoder reports the token again.
   await page.click('#hotsound');
-  assert.match(await text('#listen-info'), /after the wake-up detector/);
+  await page.waitForFunction(
+      () => /after the wake-up detector/.test(document.getElementById('listen-info').textContent));
   await page.waitForFunction(
       (message) => [...document.querySelectorAll('#tokens code')]
                        .filter((c) => c.textContent === message).length === 2,
@@ -112,6 +114,15 @@ test('the page decodes the token its microphone hears', {timeout: 2 * DECODE_TIM
   assert.match(await text('#tokens li:first-child'), /dsss, CRC passed, after wake-up/);
   await page.click('#hotsound');
   await page.screenshot({path: path.join(out, 'web-page.png'), fullPage: true});
+
+  // Stopping closes the worklet's decoder; listening again starts a new one.
+  await page.click('#stop-listen');
+  assert.equal(await text('#listen-info'), 'Stopped.');
+  await page.click('#start-listen');
+  await page.waitForFunction(
+      () => /^Listening at \d+ Hz for dsss with CRC\.$/.test(document.getElementById('listen-info').textContent),
+      {timeout: 10000});
+  assert.equal(await visible('#listen-error'), false);
 });
 
 test('bad settings show a message and leave the page working', async () => {
@@ -143,19 +154,23 @@ test('bad settings show a message and leave the page working', async () => {
   assert.equal(await visible('#send-error'), false);
   assert.match(await text('#send-info'), /Playing \d+\.\d\d s at \d+ Hz/);
   // The decoder followed the scheme change and still listens.
-  assert.match(await text('#listen-info'), /for dtmf with CRC\./);
+  await page.waitForFunction(
+      () => /for dtmf with CRC\./.test(document.getElementById('listen-info').textContent));
   // A receiver setting the decoder refuses: it keeps listening as it was.
   await page.click('#hotsound');
+  await page.waitForFunction(() => !document.getElementById('listen-error').hidden);
   assert.match(await text('#listen-error'), /the wake-up detector works with the dsss scheme/);
   assert.match(await text('#listen-info'), /for dtmf with CRC\./);
   await page.click('#hotsound');
-  assert.equal(await visible('#listen-error'), false);
+  await page.waitForFunction(() => document.getElementById('listen-error').hidden);
   assert.deepEqual(pageErrors, []);
   assert.deepEqual(foreignRequests, []);
 });
 
 test('the module answers bad arguments with messages, not exceptions', async () => {
-  const answers = await page.evaluate((message) => {
+  const answers = await page.evaluate(async (message) => {
+    const {compileModem, instantiateModem} = await import('./modem.js');
+    const modem = await instantiateModem(await compileModem());
     const decoder = new modem.Decoder();
     const result = {
       hugeRate: modem.encode({sampleRateHz: 1e20}, message, 0).error,
@@ -167,6 +182,9 @@ test('the module answers bad arguments with messages, not exceptions', async () 
       unconfigured: decoder.process(new Float32Array(4096)).length,
       lowRate: decoder.configure({sampleRateHz: 22050}),
       notFloats: decoder.process([1, 2, 3]).length,
+      // The buffer the block is copied into shrinks and grows with it.
+      short: decoder.process(new Float32Array(16)).length,
+      long: decoder.process(new Float32Array(8192)).length,
     };
     decoder.delete();
     return result;
@@ -180,5 +198,54 @@ test('the module answers bad arguments with messages, not exceptions', async () 
   assert.equal(answers.unconfigured, 0);
   assert.match(answers.lowRate, /22050 Hz rate cannot carry the 18500 Hz carrier/);
   assert.equal(answers.notFloats, 0);
+  assert.equal(answers.short, 0);
+  assert.equal(answers.long, 0);
+  assert.deepEqual(pageErrors, []);
+});
+
+test('the decoder worklet answers misuse with messages', async () => {
+  const answers = await page.evaluate(async () => {
+    const {compileModem} = await import('./modem.js');
+    const ctx = new AudioContext();
+    await ctx.audioWorklet.addModule('decoder_worklet.js');
+    // Collects the node's messages until `count` have come or a second passes.
+    const messages = (node, count) => new Promise((resolve) => {
+      const seen = [];
+      const done = () => resolve(seen);
+      node.port.onmessage = (event) => {
+        seen.push(event.data);
+        if (seen.length === count) done();
+      };
+      setTimeout(done, 1000);
+    });
+    const noModule = new AudioWorkletNode(ctx, 'sorvel-decoder', {numberOfOutputs: 0});
+    const withoutModule = await messages(noModule, 1);
+
+    const node = new AudioWorkletNode(ctx, 'sorvel-decoder',
+                                      {numberOfOutputs: 0, processorOptions: {wasmModule: await compileModem()}});
+    // Sent before the module is ready: answered in order once it is.
+    node.port.postMessage({type: 'configure', settings: {sampleRateHz: 22050}});
+    node.port.postMessage({type: 'configure', settings: 'dsss'});
+    node.port.postMessage({type: 'configure', settings: {scheme: 'dtmf', crc: true}});
+    node.port.postMessage(new Float32Array(128));
+    node.port.postMessage({type: 'close'});
+    node.port.postMessage({type: 'configure', settings: {}});
+    const answered = await messages(node, 6);
+    await ctx.close();
+    return {withoutModule, answered};
+  });
+  assert.equal(answers.withoutModule.length, 1);
+  assert.equal(answers.withoutModule[0].type, 'failed');
+  assert.match(answers.withoutModule[0].message, /processorOptions.wasmModule must be a WebAssembly.Module/);
+  const [ready, lowRate, notObject, good, notConfigure, closed] = answers.answered;
+  assert.deepEqual(ready, {type: 'ready'});
+  assert.equal(lowRate.type, 'configured');
+  assert.match(lowRate.error, /22050 Hz rate cannot carry the 18500 Hz carrier/);
+  assert.deepEqual(notObject, {type: 'configured', error: 'settings must be an object'});
+  assert.deepEqual(good, {type: 'configured', error: ''});
+  assert.equal(notConfigure.type, 'error');
+  assert.match(notConfigure.message, /takes \{type: "configure", settings\}/);
+  assert.deepEqual(closed, {type: 'error', message: 'the decoder is closed'});
+  assert.equal(answers.answered.length, 6);
   assert.deepEqual(pageErrors, []);
 });
