@@ -70,6 +70,13 @@ DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
   frame_size_ = FrameSize(params_);
   baseband_frame_size_ = frame_size_ / params_.baseband_decimation_factor;
   frame_duration_ = static_cast<float>(frame_size_) / params_.sample_rate;
+  {
+    // The tone normalisation's running maximum needs a window of at least
+    // one baseband sample; refused here rather than at the first request.
+    const int window_size = static_cast<int>(params_.tone_normalization_params.window_size *
+                                             baseband_frame_size_);
+    CHECK(window_size >= 1);
+  }
   baseband_sample_rate_ =
       params_.sample_rate / static_cast<float>(params_.baseband_decimation_factor);
 
