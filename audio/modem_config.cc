@@ -2,6 +2,7 @@
 
 #include <chrono>
 #include <cmath>
+#include <limits>
 #include <sstream>
 #include <utility>
 
@@ -28,7 +29,8 @@ int DsssSymbolsPerToken(int bits_per_symbol, int token_length_bytes) {
   return bits_per_symbol > 0 ? (8 / bits_per_symbol) * token_length_bytes : 0;
 }
 
-bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params) {
+bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params,
+                           std::string* problem) {
   DtmfEncoderParams filled;
   filled.bytes_in_token = config.bytes_in_token;
   filled.use_checksum_symbol = config.use_checksum_symbol;
@@ -41,6 +43,13 @@ bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params) 
   }
   if (config.adsr) {
     const auto& a = *config.adsr;
+    // Described instead of logged when the caller asks why.
+    if (problem != nullptr) {
+      if (auto v = ValidateAdsrWindow(filled, a[0], a[1], a[2], a[3], a[4]); !v.ok()) {
+        *problem = "adsr: " + v.message();
+        return false;
+      }
+    }
     if (!SetAdsrWindow(&filled, a[0], a[1], a[2], a[3], a[4])) return false;
   }
   *params = std::move(filled);
@@ -49,80 +58,64 @@ bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params) 
 
 namespace {
 
-template <typename... Parts>
-std::string Concat(const Parts&... parts) {
-  std::ostringstream out;
-  (out << ... << parts);
-  return out.str();
+using sorvel_base::StrCat;
+
+// The limits people-facing entry points add to what the library accepts:
+// the rates of audio hardware, and sizes past which a setting only costs
+// memory (megabytes per frame, minutes of buffered audio).
+constexpr float kMinRateHz = 8000.0f;
+constexpr float kMaxRateHz = 192000.0f;
+constexpr int kMaxTokenBytes = 64;
+constexpr int kMaxUpsamplingFactor = 32;
+// Keeps the tone arithmetic (min cycles + symbol) inside an int.
+constexpr int kMaxMinCyclesPerFrame = std::numeric_limits<int>::max() - 256;
+constexpr int kMaxTones = 32;
+constexpr float kMaxWindowDuration = 1.0f;
+constexpr int kMaxChannels = 8;
+// The decoders rank six candidates (max_candidates_rank).
+constexpr int kMaxCandidates = 6;
+
+std::string RateProblem(const char* name, float hz) {
+  if (hz >= kMinRateHz && hz <= kMaxRateHz) return "";
+  return StrCat(name, " must be between ", kMinRateHz, " and ", kMaxRateHz, " Hz, got ", hz);
 }
 
 }  // namespace
 
 std::string ValidateDsssCoderConfig(const DsssCoderConfig& c) {
-  if (c.number_of_taps < kMinTaps || c.number_of_taps > kMaxTaps) {
-    return Concat("number_of_taps must be in [", kMinTaps, ", ", kMaxTaps, "], got ",
-                  c.number_of_taps);
-  }
-  if (c.code_number < 0 || c.code_number >= NumCodesForTaps(c.number_of_taps)) {
-    return Concat("code_number must be in [0, ", NumCodesForTaps(c.number_of_taps) - 1,
-                  "] for ", c.number_of_taps, " taps, got ", c.code_number);
-  }
+  if (auto v = ValidateCodeChoice(c.number_of_taps, c.code_number); !v.ok()) return v.message();
   if (!BitsPerSymbolOk(c.bits_per_symbol)) {
-    return Concat("bits_per_symbol must be 1, 2, 4 or 8, got ", c.bits_per_symbol);
+    return StrCat("bits_per_symbol must be 1, 2, 4 or 8, got ", c.bits_per_symbol);
   }
-  if (!(c.sample_rate > 0.0f)) return Concat("sample_rate must be positive, got ", c.sample_rate);
-  if (c.upsampling_factor <= 0 || c.baseband_decimation_factor <= 0 ||
-      c.upsampling_factor % c.baseband_decimation_factor != 0) {
-    return Concat("baseband_decimation_factor (", c.baseband_decimation_factor,
-                  ") must be positive and divide upsampling_factor (", c.upsampling_factor,
-                  ")");
-  }
-  if (!(c.desired_carrier_frequency >= 0.0f &&
-        c.desired_carrier_frequency <= c.sample_rate / 2)) {
-    return Concat("carrier frequency must be in [0, ", c.sample_rate / 2, "] Hz, got ",
-                  c.desired_carrier_frequency);
-  }
-  if (c.min_cycles_per_frame < 0) {
-    return Concat("min_cycles_per_frame must be >= 0, got ", c.min_cycles_per_frame);
-  }
-  return "";
+  return ValidateSymbolWaveCoderParams(MakeSymbolWaveCoderParams(c)).message();
 }
 
 std::string ValidateDtmfConfig(const DtmfConfig& c) {
-  if (!(c.sample_rate > 0.0f)) return Concat("sample_rate must be positive, got ", c.sample_rate);
-  if (c.bytes_in_token <= 0) return Concat("token bytes must be positive, got ", c.bytes_in_token);
-  if (c.baseband_decimation_factor <= 0) {
-    return Concat("baseband_decimation_factor must be positive, got ",
-                  c.baseband_decimation_factor);
-  }
-  DtmfEncoderParams defaults;
-  defaults.sample_rate = c.sample_rate;
-  defaults.window_duration = c.window_duration;
-  defaults.baseband_decimation_factor = c.baseband_decimation_factor;
-  if (!(c.window_duration > 0.0f) || FrameSize(defaults) <= 0) {
-    return Concat("window_duration ", c.window_duration, " s gives no samples per frame");
-  }
-  const std::vector<float>& tones =
-      c.tone_frequencies.empty() ? defaults.tone_frequencies : c.tone_frequencies;
-  for (float f : tones) {
-    if (!(f >= 0.0f && f < c.sample_rate / 2)) {
-      return Concat("tone frequency ", f, " Hz must be in [0, ", c.sample_rate / 2, ")");
-    }
-  }
-  const size_t n = tones.size();
+  // What SetToneFrequencies and the window need before the record exists.
+  if (!(c.sample_rate > 0.0f)) return StrCat("sample_rate must be positive, got ", c.sample_rate);
+  const size_t n = c.tone_frequencies.empty() ? DtmfEncoderParams().tone_frequencies.size()
+                                              : c.tone_frequencies.size();
   if (c.tones_per_symbol <= 0 || static_cast<size_t>(c.tones_per_symbol) > n) {
-    return Concat("tones_per_symbol must be in [1, ", n, "], got ", c.tones_per_symbol);
+    return StrCat("tones_per_symbol must be in [1, ", n, "], got ", c.tones_per_symbol);
+  }
+  if (c.tone_frequencies.empty() && c.tones_per_symbol != 2) {
+    return "the default tones are used in pairs; give tone frequencies to change that";
   }
   if (!c.tone_frequencies.empty()) {
     const size_t symbols = MakeSymbolTable(static_cast<int>(n), c.tones_per_symbol).size();
     if (symbols < 3 || n * (n - 1) / 2 < symbols) {
-      return Concat(n, " tones taken ", c.tones_per_symbol, " at a time give ", symbols,
+      return StrCat(n, " tones taken ", c.tones_per_symbol, " at a time give ", symbols,
                     " symbols; between 3 and ", n * (n - 1) / 2, " are needed");
     }
-  } else if (c.tones_per_symbol != 2) {
-    return "the default tones are used in pairs; give tone frequencies to change that";
   }
-  return "";
+  if (c.baseband_decimation_factor <= 0) {
+    return StrCat("baseband_decimation_factor must be positive, got ",
+                  c.baseband_decimation_factor);
+  }
+  DtmfEncoderParams params;
+  std::string problem;
+  if (!MakeDtmfEncoderParams(c, &params, &problem)) return problem;
+  return ValidateDtmfEncoderParams(params).message();
 }
 
 std::unique_ptr<AudioModemEncoder> MakeDsssEncoder(const DsssEncoderConfig& config) {
@@ -145,8 +138,10 @@ std::unique_ptr<AudioModemEncoder> MakeDtmfEncoder(const DtmfConfig& config) {
   return std::make_unique<AudioModemEncoder>(std::make_unique<DtmfEncoder>(params));
 }
 
-std::unique_ptr<AudioModemDecoder> MakeDsssDecoder(const DsssDecoderConfig& config) {
-  auto coder = std::make_shared<const SymbolWaveCoder>(MakeSymbolWaveCoderParams(config.coder));
+namespace {
+
+// The DSSS receiver's record, for a coder of `samples_per_frame` samples.
+SorvaneDecoderParams DecoderRecord(const DsssDecoderConfig& config, int samples_per_frame) {
   SorvaneDecoderParams params;
   params.symbols_in_token =
       DsssSymbolsPerToken(config.coder.bits_per_symbol, config.token_length_bytes);
@@ -157,9 +152,60 @@ std::unique_ptr<AudioModemDecoder> MakeDsssDecoder(const DsssDecoderConfig& conf
   params.detection_threshold = config.detection_threshold;
   params.buffer_duration =
       TokenDurationSeconds(FramesPerToken(params.symbols_in_token, params.append_check_symbol),
-                           coder->samples_per_frame(), config.coder.sample_rate) *
+                           samples_per_frame, config.coder.sample_rate) *
       config.buffer_duration_factor;
-  auto dsss = std::make_unique<SorvaneDecoder>(std::move(coder), params);
+  return params;
+}
+
+// The multi-tone receiver's record; false as MakeDtmfEncoderParams.
+bool DecoderRecord(const DtmfDecoderConfig& config, DtmfDecoderParams* params,
+                   std::string* problem = nullptr) {
+  DtmfEncoderParams tones;
+  if (!MakeDtmfEncoderParams(config.tones, &tones, problem)) return false;
+  *params = DtmfDecoderParams(tones);
+  params->max_candidates_per_decode_token_call = config.max_candidates_per_decode_token_call;
+  params->max_buffer_duration_in_seconds =
+      TokenDurationSeconds(tones) * config.buffer_duration_factor;
+  return true;
+}
+
+DsssDecoderConfig DsssReceiver(const ModemSettings& modem, const ReceiverSettings& receiver,
+                               float rate_hz, int num_channels) {
+  DsssDecoderConfig config;
+  config.coder = modem.dsss.coder;
+  config.token_length_bytes = modem.TokenBytes();
+  config.append_check_symbol = modem.dsss.append_check_symbol;
+  config.max_candidates_to_return = receiver.max_candidates;
+  config.num_channels = num_channels;
+  config.with_hotsound = receiver.hotsound;
+  config.detection_duration = receiver.detection_duration;
+  config.detection_threshold = receiver.detection_threshold;
+  config.input_sample_rate = rate_hz;
+  if (receiver.buffer_duration_factor) {
+    config.buffer_duration_factor = *receiver.buffer_duration_factor;
+  }
+  return config;
+}
+
+DtmfDecoderConfig DtmfReceiver(const ModemSettings& modem, const ReceiverSettings& receiver,
+                               float rate_hz, int num_channels) {
+  DtmfDecoderConfig config;
+  config.tones = modem.dtmf;
+  config.max_candidates_per_decode_token_call = receiver.max_candidates;
+  config.num_channels = num_channels;
+  config.input_sample_rate = rate_hz;
+  if (receiver.buffer_duration_factor) {
+    config.buffer_duration_factor = *receiver.buffer_duration_factor;
+  }
+  return config;
+}
+
+}  // namespace
+
+std::unique_ptr<AudioModemDecoder> MakeDsssDecoder(const DsssDecoderConfig& config) {
+  auto coder = std::make_shared<const SymbolWaveCoder>(MakeSymbolWaveCoderParams(config.coder));
+  auto dsss = std::make_unique<SorvaneDecoder>(
+      coder, DecoderRecord(config, coder->samples_per_frame()));
   std::unique_ptr<AudioModemDecoder> decoder;
   if (config.with_hotsound) {
     decoder = std::make_unique<AudioModemDecoder>(std::make_unique<HotsoundDecoder>(
@@ -174,12 +220,8 @@ std::unique_ptr<AudioModemDecoder> MakeDsssDecoder(const DsssDecoderConfig& conf
 }
 
 std::unique_ptr<AudioModemDecoder> MakeDtmfDecoder(const DtmfDecoderConfig& config) {
-  DtmfEncoderParams tones;
-  if (!MakeDtmfEncoderParams(config.tones, &tones)) return nullptr;
-  DtmfDecoderParams params(tones);
-  params.max_candidates_per_decode_token_call = config.max_candidates_per_decode_token_call;
-  params.max_buffer_duration_in_seconds =
-      TokenDurationSeconds(tones) * config.buffer_duration_factor;
+  DtmfDecoderParams params;
+  if (!DecoderRecord(config, &params)) return nullptr;
   auto decoder =
       std::make_unique<AudioModemDecoder>(std::make_unique<DtmfDecoder>(params));
   decoder->Initialize(config.num_channels, config.input_sample_rate);
@@ -193,33 +235,61 @@ std::string ResolveModemSettings(ModemSettings& s) {
   if (s.MessageBytes() <= 0) {
     return "token bytes (" + std::to_string(s.TokenBytes()) + ") leave no message bytes";
   }
+  if (s.TokenBytes() > kMaxTokenBytes) {
+    return StrCat("token bytes must be at most ", kMaxTokenBytes, ", got ", s.TokenBytes());
+  }
+  if (std::string e = RateProblem("the frame sample rate", s.dsss.coder.sample_rate);
+      !e.empty()) {
+    return e;
+  }
   if (s.is_dsss()) {
     s.dsss.token_length_bytes = s.TokenBytes();
     s.dsss.coder.baseband_decimation_factor = s.decimation_factor.value_or(3);
     if (std::string e = ValidateDsssCoderConfig(s.dsss.coder); !e.empty()) return e;
-    if (s.dsss.broadcast_sample_rate <= 0) return "broadcast sample rate must be positive";
+    if (s.dsss.coder.upsampling_factor > kMaxUpsamplingFactor) {
+      return StrCat("upsampling_factor must be at most ", kMaxUpsamplingFactor, ", got ",
+                    s.dsss.coder.upsampling_factor);
+    }
+    if (s.dsss.coder.min_cycles_per_frame > kMaxMinCyclesPerFrame) {
+      return StrCat("min_cycles_per_frame must be at most ", kMaxMinCyclesPerFrame, ", got ",
+                    s.dsss.coder.min_cycles_per_frame);
+    }
+    if (std::string e = RateProblem(
+            "the broadcast sample rate", static_cast<float>(s.dsss.broadcast_sample_rate));
+        !e.empty()) {
+      return e;
+    }
     if (!(s.dsss.start_transition_duration >= 0.0f && s.dsss.start_transition_duration <= 1.0f)) {
-      return Concat("start_transition_duration must be in [0, 1] s, got ",
+      return StrCat("start_transition_duration must be in [0, 1] s, got ",
                     s.dsss.start_transition_duration);
     }
-    return "";
+    SorvaneEncoderParams encoder;
+    encoder.broadcast_sample_rate = static_cast<float>(s.dsss.broadcast_sample_rate);
+    return ValidateSorvaneEncoderParams(encoder).message();
   }
   s.dtmf.bytes_in_token = s.TokenBytes();
   s.dtmf.sample_rate = s.dsss.coder.sample_rate;
   s.dtmf.baseband_decimation_factor = s.decimation_factor.value_or(16);
   if (!s.adsr.empty()) {
     if (s.adsr.size() != 5) {
-      return Concat("adsr takes 5 values (attack, decay, sustain, release, level), got ",
+      return StrCat("adsr takes 5 values (attack, decay, sustain, release, level), got ",
                     s.adsr.size());
     }
     s.dtmf.adsr = {{s.adsr[0], s.adsr[1], s.adsr[2], s.adsr[3], s.adsr[4]}};
+  }
+  if (s.dtmf.tone_frequencies.size() > kMaxTones) {
+    return StrCat("at most ", kMaxTones, " tone frequencies, got ", s.dtmf.tone_frequencies.size());
+  }
+  if (!(s.dtmf.window_duration <= kMaxWindowDuration)) {
+    return StrCat("window_duration must be at most ", kMaxWindowDuration, " s, got ",
+                  s.dtmf.window_duration);
   }
   return ValidateDtmfConfig(s.dtmf);
 }
 
 std::string CheckMessageBytes(const ModemSettings& s, size_t message_bytes) {
   if (static_cast<int>(message_bytes) == s.MessageBytes()) return "";
-  return Concat("token has ", message_bytes, " bytes; the ", s.scheme, " scheme sends ",
+  return StrCat("token has ", message_bytes, " bytes; the ", s.scheme, " scheme sends ",
                 s.TokenBytes(), "-byte tokens, so give ", s.MessageBytes(),
                 s.crc ? " message bytes (the CRC adds 2)" : " bytes");
 }
@@ -233,34 +303,32 @@ std::string CheckHotsoundRate(double rate_hz) {
   // The detector is built for the whole-Hz rate.
   if (HotsoundDetector::RateFits(std::floor(rate_hz), carrier)) return "";
   const int needed = static_cast<int>(2 * (carrier + HotsoundDetector::kHalfBandwidth)) + 1;
-  return Concat("hotsound needs a sample rate of at least ", needed, " Hz (the ",
+  return StrCat("hotsound needs a sample rate of at least ", needed, " Hz (the ",
                 std::lround(carrier), " Hz carrier and its band), got ",
                 static_cast<int>(rate_hz), " Hz");
 }
 
 std::string CheckReceiverSettings(const ModemSettings& modem, const ReceiverSettings& r,
                                   float rate_hz, int num_channels) {
-  if (r.max_candidates < 1 || r.max_candidates > 6) {
-    return Concat("max_candidates must be in [1, 6], got ", r.max_candidates);
+  if (r.max_candidates < 1 || r.max_candidates > kMaxCandidates) {
+    return StrCat("max_candidates must be in [1, ", kMaxCandidates, "], got ", r.max_candidates);
   }
-  if (!(rate_hz > 0) || !std::isfinite(rate_hz) || num_channels < 1) {
-    return "the input needs a positive rate and channel count";
+  if (num_channels < 1 || num_channels > kMaxChannels) {
+    return StrCat("the input must have 1 to ", kMaxChannels, " channels, got ", num_channels);
   }
   // The rates the decoders are fuzzed at; far outside them their
   // resamplers cannot be built.
-  if (!(rate_hz >= 8000.0f && rate_hz <= 192000.0f)) {
-    return Concat("the input rate must be between 8000 and 192000 Hz, got ", rate_hz);
-  }
+  if (std::string e = RateProblem("the input rate", rate_hz); !e.empty()) return e;
   if (!(r.detection_duration >= 0.0f && r.detection_duration <= 10.0f)) {
-    return Concat("detection_duration must be in [0, 10] s, got ", r.detection_duration);
+    return StrCat("detection_duration must be in [0, 10] s, got ", r.detection_duration);
   }
   if (!(r.detection_threshold >= 0.0f) || !std::isfinite(r.detection_threshold)) {
-    return Concat("detection_threshold must not be negative, got ", r.detection_threshold);
+    return StrCat("detection_threshold must not be negative, got ", r.detection_threshold);
   }
   // The fuzzers cover 0.25 to 12 token durations.
   if (r.buffer_duration_factor &&
       !(*r.buffer_duration_factor >= 0.25f && *r.buffer_duration_factor <= 12.0f)) {
-    return Concat("buffer_duration_factor must be in [0.25, 12], got ",
+    return StrCat("buffer_duration_factor must be in [0.25, 12], got ",
                   *r.buffer_duration_factor);
   }
   if (r.hotsound && !modem.is_dsss()) return "hotsound works with the dsss scheme";
@@ -269,10 +337,20 @@ std::string CheckReceiverSettings(const ModemSettings& modem, const ReceiverSett
   }
   // The DSSS carrier needs a receiver rate above twice its frequency.
   if (modem.is_dsss() && rate_hz < 2 * modem.dsss.coder.desired_carrier_frequency) {
-    return Concat("a ", static_cast<int>(rate_hz), " Hz input cannot carry the ",
+    return StrCat("a ", static_cast<int>(rate_hz), " Hz input cannot carry the ",
                   static_cast<int>(modem.dsss.coder.desired_carrier_frequency), " Hz carrier");
   }
-  return "";
+  if (modem.is_dsss()) {
+    const DsssDecoderConfig config = DsssReceiver(modem, r, rate_hz, num_channels);
+    const int samples_per_frame = SamplesPerFrame(MakeSymbolWaveCoderParams(config.coder));
+    return ValidateSorvaneDecoderParams(DecoderRecord(config, samples_per_frame)).message();
+  }
+  DtmfDecoderParams params;
+  std::string problem;
+  if (!DecoderRecord(DtmfReceiver(modem, r, rate_hz, num_channels), &params, &problem)) {
+    return problem;
+  }
+  return ValidateDtmfDecoderParams(params).message();
 }
 
 std::unique_ptr<AudioModemDecoder> MakeDecoder(const ModemSettings& modem,
@@ -280,31 +358,11 @@ std::unique_ptr<AudioModemDecoder> MakeDecoder(const ModemSettings& modem,
                                                int num_channels,
                                                HotsoundDecoder::Clock hotsound_clock) {
   if (modem.is_dsss()) {
-    DsssDecoderConfig config;
-    config.coder = modem.dsss.coder;
-    config.token_length_bytes = modem.TokenBytes();
-    config.append_check_symbol = modem.dsss.append_check_symbol;
-    config.max_candidates_to_return = receiver.max_candidates;
-    config.num_channels = num_channels;
-    config.with_hotsound = receiver.hotsound;
-    config.detection_duration = receiver.detection_duration;
-    config.detection_threshold = receiver.detection_threshold;
-    config.input_sample_rate = rate_hz;
-    if (receiver.buffer_duration_factor) {
-      config.buffer_duration_factor = *receiver.buffer_duration_factor;
-    }
+    DsssDecoderConfig config = DsssReceiver(modem, receiver, rate_hz, num_channels);
     config.hotsound_clock = std::move(hotsound_clock);
     return MakeDsssDecoder(config);
   }
-  DtmfDecoderConfig config;
-  config.tones = modem.dtmf;
-  config.max_candidates_per_decode_token_call = receiver.max_candidates;
-  config.num_channels = num_channels;
-  config.input_sample_rate = rate_hz;
-  if (receiver.buffer_duration_factor) {
-    config.buffer_duration_factor = *receiver.buffer_duration_factor;
-  }
-  return MakeDtmfDecoder(config);
+  return MakeDtmfDecoder(DtmfReceiver(modem, receiver, rate_hz, num_channels));
 }
 
 HotsoundDecoder::Clock AudioTimeClock(const int64_t* frames, float rate_hz) {

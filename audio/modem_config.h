@@ -67,8 +67,9 @@ SymbolWaveCoderParams MakeSymbolWaveCoderParams(const DsssCoderConfig& config);
 int DsssSymbolsPerToken(int bits_per_symbol, int token_length_bytes);
 
 // Fills `params` (starting from the defaults); false when the ADSR window is
-// refused, which is logged.
-bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params);
+// refused, which is logged, or given `problem` described there instead.
+bool MakeDtmfEncoderParams(const DtmfConfig& config, DtmfEncoderParams* params,
+                           std::string* problem = nullptr);
 
 // An empty string when the settings are usable, else one line naming the
 // first problem. Building from invalid settings ends the process (the

@@ -25,7 +25,7 @@ expect_refusal "8-byte tokens" --token 0102 -o "$dir/x.wav"
 expect_refusal "not in {dsss,dtmf}" --scheme fsk --token 01 -o "$dir/x.wav"
 expect_refusal "cannot write" --token 010203040506 --crc -o "$dir/missing/x.wav"
 expect_refusal "number_of_taps" --token 010203040506 --crc --number-of-taps 4 -o "$dir/x.wav"
-expect_refusal "ADSR window was refused" --scheme dtmf --token 0102030405 \
+expect_refusal "Nonzero duration 0.1 exceeds" --scheme dtmf --token 0102030405 \
   --adsr 0.1,0,0,0,1 -o "$dir/x.wav"
 
 # 17 frames of 1905 samples (start + 16 symbols), 16-bit mono + 44-byte header.

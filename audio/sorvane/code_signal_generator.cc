@@ -23,19 +23,25 @@ const std::vector<std::vector<std::vector<int>>>& TapTable() {
   return *table;
 }
 
-void CheckCodeArguments(int number_of_taps, int code_number) {
-  CHECK(number_of_taps >= kMinTaps);
-  CHECK(number_of_taps <= 11);
-  CHECK(code_number >= 0);
-  CHECK_LE(code_number, number_of_taps <= 6 ? 2 : 3);
-}
-
 }  // namespace
 
 int NumCodesForTaps(int number_of_taps) { return number_of_taps <= 6 ? 3 : 4; }
 
+sorvel_base::Validation ValidateCodeChoice(int number_of_taps, int code_number) {
+  SORVEL_REQUIRE(number_of_taps >= kMinTaps, "number_of_taps must be in [", kMinTaps, ", ",
+                 kMaxTaps, "], got ", number_of_taps);
+  SORVEL_REQUIRE(number_of_taps <= 11, "number_of_taps must be in [", kMinTaps, ", ", kMaxTaps,
+                 "], got ", number_of_taps);
+  SORVEL_REQUIRE(code_number >= 0, "code_number must not be negative, got ", code_number);
+  SORVEL_REQUIRE_AS(code_number < NumCodesForTaps(number_of_taps),
+                    "code_number <= number_of_taps <= 6 ? 2 : 3", "code_number must be in [0, ",
+                    NumCodesForTaps(number_of_taps) - 1, "] for ", number_of_taps,
+                    " taps, got ", code_number);
+  return {};
+}
+
 const std::vector<int>& CodeTaps(int number_of_taps, int code_number) {
-  CheckCodeArguments(number_of_taps, code_number);
+  CHECK_VALID(ValidateCodeChoice(number_of_taps, code_number));
   return TapTable()[number_of_taps - kMinTaps][code_number];
 }
 

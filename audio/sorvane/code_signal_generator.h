@@ -17,6 +17,8 @@
 
 #include <vector>
 
+#include "base/validation.h"
+
 namespace audio_sorvane {
 
 inline constexpr int kMinTaps = 5;
@@ -26,6 +28,9 @@ inline constexpr int kDefaultCodeNumber = 0;
 
 // Number of codes available for a register length: 3 for 5 and 6, else 4.
 int NumCodesForTaps(int number_of_taps);
+
+// Refuses a (number_of_taps, code_number) pair outside the table.
+sorvel_base::Validation ValidateCodeChoice(int number_of_taps, int code_number);
 
 // The feedback tap set (register offsets, largest = number_of_taps - 1).
 const std::vector<int>& CodeTaps(int number_of_taps, int code_number);

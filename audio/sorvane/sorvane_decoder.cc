@@ -27,10 +27,32 @@ constexpr double kMaxSavedSeconds = 30.0;
 
 }  // namespace
 
+sorvel_base::Validation ValidateSorvaneDecoderParams(const SorvaneDecoderParams& params) {
+  SORVEL_REQUIRE(params.symbols_in_token > 0, "symbols_in_token must be positive, got ",
+                 params.symbols_in_token);
+  SORVEL_REQUIRE(params.max_candidates_to_return > 0, "max_candidates must be in [1, ",
+                 params.max_candidates_rank, "], got ", params.max_candidates_to_return);
+  SORVEL_REQUIRE(params.max_candidates_to_return <= params.max_candidates_rank,
+                 "max_candidates must be in [1, ", params.max_candidates_rank, "], got ",
+                 params.max_candidates_to_return);
+  SORVEL_REQUIRE(params.max_candidates_rank <= params.max_candidates_to_consider,
+                 "max_candidates_rank (", params.max_candidates_rank,
+                 ") must not exceed max_candidates_to_consider (",
+                 params.max_candidates_to_consider, ")");
+  SORVEL_REQUIRE(params.num_chunks > 0, "num_chunks must be positive, got ", params.num_chunks);
+  // Both are rounded to sample counts.
+  SORVEL_REQUIRE(std::isfinite(params.detection_duration),
+                 "detection_duration must be finite, got ", params.detection_duration);
+  SORVEL_REQUIRE(std::isfinite(params.buffer_duration), "buffer_duration must be finite, got ",
+                 params.buffer_duration);
+  return {};
+}
+
 SorvaneDecoder::SorvaneDecoder(std::shared_ptr<const SymbolWaveCoder> symbol_wave_coder,
                                const SorvaneDecoderParams& params)
     : params_(params) {
   CHECK(symbol_wave_coder);
+  CHECK_VALID(ValidateSorvaneDecoderParams(params));
   coder_ = std::move(symbol_wave_coder);
   const SymbolWaveCoderParams& coder_params = coder_->params();
   frame_size_ = coder_->samples_per_frame() / coder_params.baseband_decimation_factor;

@@ -37,6 +37,7 @@
 #include "audio/sorvane/symbol_wave_coder.h"
 #include "audio/sorvane/token_selector.h"
 #include "audio/sorvane/token_symbol_converter.h"
+#include "base/validation.h"
 
 namespace audio_sorvane {
 
@@ -74,6 +75,10 @@ struct SorvaneDecoderParams {
   int max_candidates_rank = 6;
   int max_candidates_to_return = 2;
 };
+
+// Refuses a record the decoder cannot be built from (the constructor ends
+// the process on it).
+sorvel_base::Validation ValidateSorvaneDecoderParams(const SorvaneDecoderParams& params);
 
 class SorvaneDecoder {
  public:

@@ -10,6 +10,12 @@
 
 namespace audio_sorvane {
 
+sorvel_base::Validation ValidateSorvaneEncoderParams(const SorvaneEncoderParams& params) {
+  SORVEL_REQUIRE_AS(params.broadcast_sample_rate > 0.0, "params_.broadcast_sample_rate > 0.0",
+                    "broadcast sample rate must be positive, got ", params.broadcast_sample_rate);
+  return {};
+}
+
 SorvaneEncoder::SorvaneEncoder(
     std::shared_ptr<const SymbolWaveCoder> symbol_wave_coder,
     const SorvaneEncoderParams& params)
@@ -18,7 +24,7 @@ SorvaneEncoder::SorvaneEncoder(
   symbol_wave_coder_ = std::move(symbol_wave_coder);
   converter_ = std::make_unique<TokenSymbolConverter>(
       symbol_wave_coder_->params().bits_per_symbol);
-  CHECK(params_.broadcast_sample_rate > 0.0);
+  CHECK_VALID(ValidateSorvaneEncoderParams(params_));
 }
 
 bool SorvaneEncoder::Encode(const std::vector<uint8_t>& token_bytes,

@@ -16,6 +16,7 @@
 
 #include "audio/sorvane/symbol_wave_coder.h"
 #include "audio/sorvane/token_symbol_converter.h"
+#include "base/validation.h"
 
 namespace audio_sorvane {
 
@@ -33,6 +34,10 @@ struct SorvaneEncoderParams {
   // Output rate in Hz; must be set (> 0).
   float broadcast_sample_rate = 0.0f;
 };
+
+// Refuses a record the encoder cannot be built from (the constructor ends
+// the process on it).
+sorvel_base::Validation ValidateSorvaneEncoderParams(const SorvaneEncoderParams& params);
 
 class SorvaneEncoder {
  public:

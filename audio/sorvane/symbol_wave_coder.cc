@@ -43,21 +43,38 @@ void InterpolateCode(std::span<const float> code, int length,
   for (float& v : *upsampled_code) v = static_cast<float>(v * scale);
 }
 
+sorvel_base::Validation ValidateSymbolWaveCoderParams(const SymbolWaveCoderParams& params) {
+  SORVEL_REQUIRE(params.sample_rate > 0.0, "sample_rate must be positive, got ",
+                 params.sample_rate);
+  SORVEL_REQUIRE(params.upsampling_factor > 0, "upsampling_factor must be positive, got ",
+                 params.upsampling_factor);
+  SORVEL_REQUIRE(params.desired_carrier_frequency >= 0.0, "carrier frequency must be in [0, ",
+                 params.sample_rate / 2, "] Hz, got ", params.desired_carrier_frequency);
+  SORVEL_REQUIRE(params.desired_carrier_frequency <= params.sample_rate / 2,
+                 "carrier frequency must be in [0, ", params.sample_rate / 2, "] Hz, got ",
+                 params.desired_carrier_frequency);
+  SORVEL_REQUIRE(params.bits_per_symbol > 0, "bits_per_symbol must be positive, got ",
+                 params.bits_per_symbol);
+  SORVEL_REQUIRE(params.min_cycles_per_frame >= 0, "min_cycles_per_frame must be >= 0, got ",
+                 params.min_cycles_per_frame);
+  SORVEL_REQUIRE(params.baseband_decimation_factor > 0,
+                 "baseband_decimation_factor must be positive, got ",
+                 params.baseband_decimation_factor);
+  SORVEL_REQUIRE(params.upsampling_factor % params.baseband_decimation_factor == 0,
+                 "baseband_decimation_factor (", params.baseband_decimation_factor,
+                 ") must divide upsampling_factor (", params.upsampling_factor, ")");
+  SORVEL_REQUIRE(params.pedestal_amplitude > 0.0f, "pedestal_amplitude must be positive, got ",
+                 params.pedestal_amplitude);
+  SORVEL_REQUIRE(!params.code.empty(), "the spreading code is empty");
+  return {};
+}
+
 SymbolWaveCoder::SymbolWaveCoder(const SymbolWaveCoderParams& params)
     : params_(params) {
-  CHECK(params.sample_rate > 0.0);
-  CHECK(params.upsampling_factor > 0);
-  CHECK(params.desired_carrier_frequency >= 0.0);
-  CHECK(params.desired_carrier_frequency <= params.sample_rate / 2);
-  CHECK(params.bits_per_symbol > 0);
-  CHECK(params.min_cycles_per_frame >= 0);
-  CHECK(params.baseband_decimation_factor > 0);
-  CHECK(params.upsampling_factor % params.baseband_decimation_factor == 0);
-  CHECK(params.pedestal_amplitude > 0.0f);
-  CHECK(!params.code.empty());
+  CHECK_VALID(ValidateSymbolWaveCoderParams(params));
 
   alphabet_size_ = (1 << params_.bits_per_symbol) + 1;
-  const int n = params_.upsampling_factor * static_cast<int>(params_.code.size());
+  const int n = SamplesPerFrame(params_);
   samples_per_frame_ = n;
   carrier_cycles_per_frame_ = static_cast<int>(std::floor(
       params_.desired_carrier_frequency * static_cast<float>(n) / params_.sample_rate));

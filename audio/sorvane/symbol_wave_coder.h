@@ -23,6 +23,7 @@
 #include <vector>
 
 #include "audio/dsp/eigen_types.h"
+#include "base/validation.h"
 
 namespace audio_sorvane {
 
@@ -39,6 +40,16 @@ struct SymbolWaveCoderParams {
   bool use_quadrature = false;           // tone on the cosine carrier
   float pedestal_amplitude = 1.0f;       // > 0, constant carrier part
 };
+
+// Refuses a record the coder cannot be built from (the constructor ends the
+// process on it).
+sorvel_base::Validation ValidateSymbolWaveCoderParams(const SymbolWaveCoderParams& params);
+
+// Samples per frame at the full rate: one code period, upsampling_factor
+// samples per chip.
+inline int SamplesPerFrame(const SymbolWaveCoderParams& params) {
+  return params.upsampling_factor * static_cast<int>(params.code.size());
+}
 
 class SymbolWaveCoder {
  public:

@@ -42,41 +42,70 @@ TokenSelectorParams SelectorParams(const DtmfDecoderParams& params, int symbols_
 
 }  // namespace
 
+sorvel_base::Validation ValidateDtmfDecoderParams(const DtmfDecoderParams& params) {
+  SORVEL_RETURN_IF_INVALID(ValidateDtmfEncoderParams(params));
+  SORVEL_REQUIRE(params.max_meters_per_second >= 0.0,
+                 "max_meters_per_second must not be negative, got ", params.max_meters_per_second);
+  SORVEL_REQUIRE(params.max_buffer_duration_in_seconds > 0.0,
+                 "the buffer duration must be positive, got ",
+                 params.max_buffer_duration_in_seconds, " s");
+  const ToneNormalizationParams& normalization = params.tone_normalization_params;
+  SORVEL_REQUIRE(params.tone_normalization_params.window_size >= 0.0,
+                 "the normalisation window must not be negative, got ", normalization.window_size);
+  SORVEL_REQUIRE(params.tone_normalization_params.cross_frequency_weight >= 0.0,
+                 "cross_frequency_weight must not be negative, got ",
+                 normalization.cross_frequency_weight);
+  SORVEL_REQUIRE(params.tone_normalization_params.division_floor >= 0.0,
+                 "division_floor must not be negative, got ", normalization.division_floor);
+  SORVEL_REQUIRE(params.noise_estimate_filter_order > 0,
+                 "noise_estimate_filter_order must be positive, got ",
+                 params.noise_estimate_filter_order);
+  SORVEL_REQUIRE(params.noise_estimate_filter_stddev > 0.0,
+                 "noise_estimate_filter_stddev must be positive, got ",
+                 params.noise_estimate_filter_stddev);
+  SORVEL_REQUIRE(params.acquisition_threshold >= 0.0,
+                 "acquisition_threshold must not be negative, got ", params.acquisition_threshold);
+  SORVEL_REQUIRE(params.max_candidates_rank > 0, "max_candidates_rank must be positive, got ",
+                 params.max_candidates_rank);
+  SORVEL_REQUIRE(params.max_candidates_per_decode_token_call > 0,
+                 "max_candidates must be positive, got ",
+                 params.max_candidates_per_decode_token_call);
+  SORVEL_REQUIRE(params.token_threshold_factor >= 0,
+                 "token_threshold_factor must not be negative, got ",
+                 params.token_threshold_factor);
+  const RoomSearchParams& room = params.room_search;
+  SORVEL_REQUIRE(params.room_search.settle_frames >= 0, "room_search.settle_frames must not be "
+                 "negative, got ", room.settle_frames);
+  SORVEL_REQUIRE(params.room_search.max_frames > 0, "room_search.max_frames must be positive, got ",
+                 room.max_frames);
+  SORVEL_REQUIRE(params.room_search.timing_candidates > 0,
+                 "room_search.timing_candidates must be positive, got ", room.timing_candidates);
+  SORVEL_REQUIRE(params.room_search.timings_searched > 0,
+                 "room_search.timings_searched must be positive, got ", room.timings_searched);
+  SORVEL_REQUIRE(params.room_search.max_tokens > 0, "room_search.max_tokens must be positive, got ",
+                 room.max_tokens);
+  // The tone normalisation's running maximum needs a window of at least one
+  // baseband sample.
+  const int window_size = static_cast<int>(normalization.window_size *
+                                           (FrameSize(params) / params.baseband_decimation_factor));
+  SORVEL_REQUIRE(window_size >= 1, "the normalisation window (", normalization.window_size,
+                 " frames) is under one baseband sample; use a longer window_duration or a "
+                 "smaller baseband_decimation_factor");
+  return {};
+}
+
 DtmfDecoder::DtmfDecoder(const DtmfDecoderParams& params)
     : params_(params),
       converter_(static_cast<int>(params.symbol_table.size()), params.spacer_symbol,
                  params.bytes_in_token),
       token_selector_(std::make_unique<TokenSelector>(
           SelectorParams(params, converter_.symbols_in_token()))) {
-  CheckDtmfEncoderParams(params);
-  CHECK(params.max_meters_per_second >= 0.0);
-  CHECK(params.max_buffer_duration_in_seconds > 0.0);
-  CHECK(params.tone_normalization_params.window_size >= 0.0);
-  CHECK(params.tone_normalization_params.cross_frequency_weight >= 0.0);
-  CHECK(params.tone_normalization_params.division_floor >= 0.0);
-  CHECK(params.noise_estimate_filter_order > 0);
-  CHECK(params.noise_estimate_filter_stddev > 0.0);
-  CHECK(params.acquisition_threshold >= 0.0);
-  CHECK(params.max_candidates_rank > 0);
-  CHECK(params.max_candidates_per_decode_token_call > 0);
-  CHECK(params.token_threshold_factor >= 0);
-  CHECK(params.room_search.settle_frames >= 0);
-  CHECK(params.room_search.max_frames > 0);
-  CHECK(params.room_search.timing_candidates > 0);
-  CHECK(params.room_search.timings_searched > 0);
-  CHECK(params.room_search.max_tokens > 0);
+  CHECK_VALID(ValidateDtmfDecoderParams(params));
 
   num_frequencies_ = static_cast<int>(params_.tone_frequencies.size());
   frame_size_ = FrameSize(params_);
   baseband_frame_size_ = frame_size_ / params_.baseband_decimation_factor;
   frame_duration_ = static_cast<float>(frame_size_) / params_.sample_rate;
-  {
-    // The tone normalisation's running maximum needs a window of at least
-    // one baseband sample; refused here rather than at the first request.
-    const int window_size = static_cast<int>(params_.tone_normalization_params.window_size *
-                                             baseband_frame_size_);
-    CHECK(window_size >= 1);
-  }
   baseband_sample_rate_ =
       params_.sample_rate / static_cast<float>(params_.baseband_decimation_factor);
 

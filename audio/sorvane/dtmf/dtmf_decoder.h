@@ -105,6 +105,10 @@ struct DtmfDecoderParams : DtmfEncoderParams {
   bool use_reference_paths = false;
 };
 
+// Refuses a record the decoder cannot be built from (the constructor ends
+// the process on it): the tone record's faults first, then the receiver's.
+sorvel_base::Validation ValidateDtmfDecoderParams(const DtmfDecoderParams& params);
+
 // Per-column values of the tone buffers, rows x capacity floats keyed by
 // stream position (position mod capacity): appending and dropping move
 // nothing. Grows (keeping a given range) only when asked for more room.

@@ -65,33 +65,35 @@ void SetToneFrequencies(const std::vector<float>& frequencies,
   params->spacer_symbol = static_cast<int>(params->symbol_table.size()) - 1;
 }
 
+sorvel_base::Validation ValidateAdsrWindow(const DtmfEncoderParams& params, float attack,
+                                           float decay, float sustain, float release,
+                                           float sustain_amplitude) {
+  SORVEL_REQUIRE(params.sample_rate > 0, "Called with invalid sample rate.");
+  // Written so that NaN fails too.
+  SORVEL_REQUIRE(attack >= 0 && decay >= 0 && sustain >= 0 && release >= 0,
+                 "Time parameters must be nonnegative.");
+  SORVEL_REQUIRE(sustain_amplitude >= 0.0f && sustain_amplitude <= 1.0f, "Sustain amplitude ",
+                 sustain_amplitude, " is outside of [0, 1].");
+  const float total = attack + decay + sustain + release;
+  // A few ulps of slack, so that stages summing to the window duration up to
+  // rounding pass.
+  SORVEL_REQUIRE(total <= params.window_duration * 1.0000005f, "Nonzero duration ", total,
+                 " exceeds ", params.window_duration, ".");
+  return {};
+}
+
 bool SetAdsrWindow(DtmfEncoderParams* params, float attack, float decay,
                    float sustain, float release, float sustain_amplitude) {
   if (params == nullptr) {
     LOG(ERROR) << "SetAdsrWindow(): Called with null pointer.";
     return false;
   }
-  if (params->sample_rate <= 0) {
-    LOG(ERROR) << "SetAdsrWindow(): Called with invalid sample rate.";
-    return false;
-  }
-  if (attack < 0 || decay < 0 || sustain < 0 || release < 0) {
-    LOG(ERROR) << "SetAdsrWindow(): Time parameters must be nonnegative.";
-    return false;
-  }
-  if (!(sustain_amplitude >= 0.0f && sustain_amplitude <= 1.0f)) {
-    LOG(ERROR) << "SetAdsrWindow(): Sustain amplitude " << sustain_amplitude
-               << " is outside of [0, 1].";
+  if (auto v = ValidateAdsrWindow(*params, attack, decay, sustain, release, sustain_amplitude);
+      !v.ok()) {
+    LOG(ERROR) << "SetAdsrWindow(): " << v.message();
     return false;
   }
   const float total = attack + decay + sustain + release;
-  // A few ulps of slack, so that stages summing to the window duration up to
-  // rounding pass.
-  if (total > params->window_duration * 1.0000005f) {
-    LOG(ERROR) << "SetAdsrWindow(): Nonzero duration " << total << " exceeds "
-               << params->window_duration << ".";
-    return false;
-  }
 
   const auto smooth_step = [](float x) { return x * x * (3.0f - 2.0f * x); };
   const float s = sustain_amplitude;
@@ -132,39 +134,66 @@ void SetSineWindow(DtmfEncoderParams* params) {
   }
 }
 
-void CheckDtmfEncoderParams(const DtmfEncoderParams& params) {
-  CHECK(params.sample_rate > 0.0f);
-  CHECK(params.baseband_decimation_factor > 0);
-  CHECK(params.window_duration > 0.0f);
+sorvel_base::Validation ValidateDtmfEncoderParams(const DtmfEncoderParams& params) {
+  SORVEL_REQUIRE(params.sample_rate > 0.0f, "sample_rate must be positive, got ",
+                 params.sample_rate);
+  SORVEL_REQUIRE(params.baseband_decimation_factor > 0,
+                 "baseband_decimation_factor must be positive, got ",
+                 params.baseband_decimation_factor);
+  SORVEL_REQUIRE(params.window_duration > 0.0f, "window_duration must be positive, got ",
+                 params.window_duration, " s");
   const int frame_size = FrameSize(params);
-  CHECK(frame_size > 0);
+  SORVEL_REQUIRE(frame_size > 0, "window_duration ", params.window_duration,
+                 " s gives no samples per frame");
   if (!params.window_samples.empty()) {
-    CHECK(static_cast<int>(params.window_samples.size()) == frame_size);
+    SORVEL_REQUIRE(static_cast<int>(params.window_samples.size()) == frame_size,
+                   "the window has ", params.window_samples.size(), " samples, a frame ",
+                   frame_size);
     for (float sample : params.window_samples) {
-      CHECK(std::isfinite(sample));
-      CHECK(sample >= 0.0);
+      SORVEL_REQUIRE(std::isfinite(sample), "window samples must be finite");
+      SORVEL_REQUIRE(sample >= 0.0, "window samples must not be negative, got ", sample);
     }
   }
   const float nyquist_frequency = params.sample_rate * 0.5f;
   for (float frequency : params.tone_frequencies) {
-    CHECK(frequency >= 0.0);
-    CHECK(frequency < nyquist_frequency);
+    SORVEL_REQUIRE(frequency >= 0.0, "tone frequency ", frequency, " Hz must be in [0, ",
+                   nyquist_frequency, ")");
+    SORVEL_REQUIRE(frequency < nyquist_frequency, "tone frequency ", frequency,
+                   " Hz must be in [0, ", nyquist_frequency, ")");
   }
-  CHECK(params.symbol_table.size() >= 3);
-  CHECK(params.tone_frequencies.size() * (params.tone_frequencies.size() - 1) / 2 >=
-        params.symbol_table.size());
-  CHECK(params.tones_per_symbol > 0);
+  const size_t tones = params.tone_frequencies.size();
+  SORVEL_REQUIRE(params.symbol_table.size() >= 3, "the symbol table needs at least 3 symbols, has ",
+                 params.symbol_table.size());
+  SORVEL_REQUIRE(params.tone_frequencies.size() * (params.tone_frequencies.size() - 1) / 2 >=
+                     params.symbol_table.size(),
+                 tones, " tones give at most ", tones * (tones - 1) / 2, " symbols; the table has ",
+                 params.symbol_table.size());
+  SORVEL_REQUIRE(params.tones_per_symbol > 0, "tones_per_symbol must be positive, got ",
+                 params.tones_per_symbol);
   for (const std::vector<int>& symbol_frequencies : params.symbol_table) {
-    CHECK(static_cast<int>(symbol_frequencies.size()) == params.tones_per_symbol);
+    SORVEL_REQUIRE(static_cast<int>(symbol_frequencies.size()) == params.tones_per_symbol,
+                   "every symbol must have tones_per_symbol (", params.tones_per_symbol,
+                   ") tones");
     for (int index : symbol_frequencies) {
-      CHECK(index >= 0);
-      CHECK(index < static_cast<int>(params.tone_frequencies.size()));
+      SORVEL_REQUIRE(index >= 0, "tone index ", index, " is negative");
+      SORVEL_REQUIRE(index < static_cast<int>(params.tone_frequencies.size()), "tone index ",
+                     index, " is past the ", tones, " tones");
     }
   }
-  CHECK(params.spacer_symbol >= 0);
-  CHECK(params.spacer_symbol < static_cast<int>(params.symbol_table.size()));
-  CHECK(params.bytes_in_token > 0);
-  CHECK(params.max_amplitude > 0.0);
+  SORVEL_REQUIRE(params.spacer_symbol >= 0, "spacer_symbol must not be negative, got ",
+                 params.spacer_symbol);
+  SORVEL_REQUIRE(params.spacer_symbol < static_cast<int>(params.symbol_table.size()),
+                 "spacer_symbol must be below the ", params.symbol_table.size(),
+                 " symbols, got ", params.spacer_symbol);
+  SORVEL_REQUIRE(params.bytes_in_token > 0, "token bytes must be positive, got ",
+                 params.bytes_in_token);
+  SORVEL_REQUIRE(params.max_amplitude > 0.0, "max_amplitude must be positive, got ",
+                 params.max_amplitude);
+  return {};
+}
+
+void CheckDtmfEncoderParams(const DtmfEncoderParams& params) {
+  CHECK_VALID(ValidateDtmfEncoderParams(params));
 }
 
 }  // namespace audio_sorvane

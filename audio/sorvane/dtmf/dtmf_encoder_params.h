@@ -11,6 +11,8 @@
 
 #include <vector>
 
+#include "base/validation.h"
+
 namespace audio_sorvane {
 
 struct DtmfEncoderParams {
@@ -62,11 +64,20 @@ void SetToneFrequencies(const std::vector<float>& frequencies,
 bool SetAdsrWindow(DtmfEncoderParams* params, float attack, float decay,
                    float sustain, float release, float sustain_amplitude);
 
+// Refuses the arguments SetAdsrWindow would refuse; the message is the
+// sentence it logs.
+sorvel_base::Validation ValidateAdsrWindow(const DtmfEncoderParams& params, float attack,
+                                           float decay, float sustain, float release,
+                                           float sustain_amplitude);
+
 // Fills window_samples with sin(pi i / frame_size), i = 0 .. frame_size - 1.
 void SetSineWindow(DtmfEncoderParams* params);
 
-// Validates the record; every fault ends the process through CHECK. An empty
+// Refuses a record the encoder or decoder cannot be built from. An empty
 // window is valid.
+sorvel_base::Validation ValidateDtmfEncoderParams(const DtmfEncoderParams& params);
+
+// Ends the process on a record ValidateDtmfEncoderParams refuses.
 void CheckDtmfEncoderParams(const DtmfEncoderParams& params);
 
 }  // namespace audio_sorvane
