@@ -6,23 +6,12 @@ package com.tessal.android.orv.audiomodem;
  * {@code sorvel} tool's defaults). Sender and receiver must use the same
  * settings, except those marked as one side's only.
  *
- * <p>Immutable and thread safe. {@link Builder#build()} checks every value
- * against the limits the native modem enforces (plus the sample-rate, token
- * and upsampling ranges this API allows) and throws {@link
- * IllegalArgumentException} naming the setting and its range, so settings
- * that reach the library never end the process.
+ * <p>Immutable and thread safe. {@link Builder#build()} asks the library
+ * whether it takes the settings and throws {@link IllegalArgumentException}
+ * with its message naming the setting and its range, so settings that reach
+ * the native peers never end the process.
  */
 public final class DsssSettings {
-  /** Spreading codes per register length: three for 5 and 6 taps, else four. */
-  static int codesForTaps(int numberOfTaps) {
-    return numberOfTaps <= 6 ? 3 : 4;
-  }
-
-  /** Upsampling factors this API allows; larger ones cost megabytes per frame. */
-  static final int MAX_UPSAMPLING_FACTOR = 32;
-  /** Keeps the native tone arithmetic (min cycles + symbol) inside an int. */
-  static final int MAX_MIN_CYCLES_PER_FRAME = Integer.MAX_VALUE - 256;
-
   private final int tokenLengthBytes;
   private final boolean appendCheckSymbol;
   private final int numberOfTaps;
@@ -103,6 +92,17 @@ public final class DsssSettings {
   public int broadcastSampleRate() { return broadcastSampleRate; }
   public float startTransitionDuration() { return startTransitionDuration; }
 
+  /**
+   * The library's objection to a sender of these settings and a receiver of
+   * them at {@code inputSampleRate} with {@code channels} channels, or null.
+   */
+  String objection(boolean crc, float inputSampleRate, int channels, boolean hotsound) {
+    return NativeSettings.nativeCheckDsss(tokenLengthBytes, crc, appendCheckSymbol, numberOfTaps,
+        codeNumber, upsamplingFactor, bitsPerSymbol, minCyclesPerFrame, basebandDecimationFactor,
+        useQuadrature, sampleRate, desiredCarrierFrequency, broadcastSampleRate,
+        startTransitionDuration, maxCandidatesToReturn, inputSampleRate, channels, hotsound);
+  }
+
   /** Collects settings; not thread safe. Setters only store, build() checks. */
   public static final class Builder {
     private int tokenLengthBytes = 8;
@@ -154,31 +154,12 @@ public final class DsssSettings {
     /** Sender only: fade-in before the loop, 0 to 1 s. */
     public Builder startTransitionDuration(float s) { startTransitionDuration = s; return this; }
 
-    /** Checks every value (in the order the library does) and builds the settings. */
+    /** Asks the library whether it takes these settings, and builds them. */
     public DsssSettings build() {
-      Checks.intIn("tokenLengthBytes", tokenLengthBytes, 1, Checks.MAX_TOKEN_BYTES);
-      Checks.intIn("numberOfTaps", numberOfTaps, 5, 11);
-      int codes = codesForTaps(numberOfTaps);
-      if (codeNumber < 0 || codeNumber >= codes) {
-        throw Checks.fail("codeNumber must be in [0, " + (codes - 1) + "] for " + numberOfTaps
-            + " taps, got " + codeNumber);
-      }
-      if (bitsPerSymbol != 1 && bitsPerSymbol != 2 && bitsPerSymbol != 4 && bitsPerSymbol != 8) {
-        throw Checks.fail("bitsPerSymbol must be 1, 2, 4 or 8, got " + bitsPerSymbol);
-      }
-      Checks.rate("sampleRate", sampleRate);
-      Checks.intIn("upsamplingFactor", upsamplingFactor, 1, MAX_UPSAMPLING_FACTOR);
-      if (basebandDecimationFactor <= 0 || upsamplingFactor % basebandDecimationFactor != 0) {
-        throw Checks.fail("basebandDecimationFactor must be positive and divide upsamplingFactor ("
-            + upsamplingFactor + "), got " + basebandDecimationFactor);
-      }
-      // Float arithmetic, as the coder compares it.
-      Checks.floatIn("desiredCarrierFrequency", desiredCarrierFrequency, 0f, sampleRate / 2);
-      Checks.intIn("minCyclesPerFrame", minCyclesPerFrame, 0, MAX_MIN_CYCLES_PER_FRAME);
-      Checks.intIn("maxCandidatesToReturn", maxCandidatesToReturn, 1, Checks.MAX_CANDIDATES);
-      Checks.rate("broadcastSampleRate", broadcastSampleRate);
-      Checks.floatIn("startTransitionDuration", startTransitionDuration, 0f, 1f);
-      return new DsssSettings(this);
+      DsssSettings settings = new DsssSettings(this);
+      // A receiver at the frame rate can carry any carrier the coder accepts.
+      NativeSettings.require(settings.objection(false, sampleRate, 1, false));
+      return settings;
     }
   }
 }

@@ -1,7 +1,5 @@
 package com.tessal.android.orv.audiomodem;
 
-import java.util.Arrays;
-
 /**
  * Settings of the multi-tone scheme: ten pentatonic tones from 740 Hz sounded
  * in pairs, 50 ms frames at 44.1 kHz and 5-byte tokens by default (the
@@ -14,19 +12,12 @@ import java.util.Arrays;
  * windowDuration} each, sustain six tenths, sustain amplitude 0.5 (at the
  * default 50 ms: 5, 5, 30 and 5 ms).
  *
- * <p>Immutable and thread safe. {@link Builder#build()} checks every value
- * against the limits the native modem enforces (plus the sample-rate, token,
- * tone-count and frame-length ranges this API allows) and throws {@link
- * IllegalArgumentException} naming the setting and its range, so settings
- * that reach the library never end the process.
+ * <p>Immutable and thread safe. {@link Builder#build()} asks the library
+ * whether it takes the settings and throws {@link IllegalArgumentException}
+ * with its message naming the setting and its range, so settings that reach
+ * the native peers never end the process.
  */
 public final class DtmfSettings {
-  /** Tones a symbol table may draw from: the receiver keeps tone sets as 32-bit masks. */
-  static final int MAX_TONES = 32;
-  static final float MAX_WINDOW_DURATION = 1f;
-  /** The default tones: two pentatonic octaves from 740 Hz, as the library builds them. */
-  private static final float[] DEFAULT_TONES = pentatonicTones(2, 740f);
-
   private final int bytesInToken;
   private final boolean useChecksumSymbol;
   private final int basebandDecimationFactor;
@@ -87,33 +78,14 @@ public final class DtmfSettings {
   public float[] adsr() { return adsr.clone(); }
   public int maxCandidatesPerDecodeTokenCall() { return maxCandidatesPerDecodeTokenCall; }
 
-  /** Samples per frame: a multiple of the decimation factor nearest the window duration. */
-  static long frameSize(float windowDuration, float sampleRate, int decimation) {
-    // Float arithmetic and round-half-up, as the library computes it.
-    return (long) decimation * Math.round(windowDuration * sampleRate / (float) decimation);
-  }
-
-  /** Number of k-element subsets of n tones, capped past n(n-1)/2 + 1. */
-  static long symbolCount(int n, int k) {
-    long cap = (long) n * (n - 1) / 2 + 1;
-    long c = 1;
-    for (int i = 1; i <= k; i++) {
-      c = c * (n - k + i) / i;
-      if (c > cap) return cap;
-    }
-    return c;
-  }
-
-  private static float[] pentatonicTones(int octaves, float base) {
-    final int[] offsets = {0, 2, 4, 7, 9};
-    float[] tones = new float[5 * octaves];
-    for (int octave = 0; octave < octaves; octave++) {
-      for (int i = 0; i < 5; i++) {
-        tones[5 * octave + i] = (float) Math.pow(2.0, offsets[i] / 12.0) * base;
-      }
-      base *= 2f;
-    }
-    return tones;
+  /**
+   * The library's objection to a sender of these settings and a receiver of
+   * them at {@code inputSampleRate} with {@code channels} channels, or null.
+   */
+  String objection(boolean crc, float inputSampleRate, int channels) {
+    return NativeSettings.nativeCheckDtmf(bytesInToken, crc, useChecksumSymbol,
+        basebandDecimationFactor, tonesPerSymbol, toneFrequencies, sampleRate, windowDuration,
+        adsr, maxCandidatesPerDecodeTokenCall, inputSampleRate, channels);
   }
 
   /** Collects settings; not thread safe. Setters only store, build() checks. */
@@ -171,73 +143,16 @@ public final class DtmfSettings {
       return this;
     }
 
-    /** Checks every value and builds the settings. */
+    /** Asks the library whether it takes these settings, and builds them. */
     public DtmfSettings build() {
-      Checks.rate("sampleRate", sampleRate);
-      Checks.intIn("bytesInToken", bytesInToken, 1, Checks.MAX_TOKEN_BYTES);
-      if (basebandDecimationFactor <= 0) {
-        throw Checks.fail(
-            "basebandDecimationFactor must be at least 1, got " + basebandDecimationFactor);
-      }
-      if (!(windowDuration > 0f && windowDuration <= MAX_WINDOW_DURATION)) {
-        throw Checks.fail("windowDuration must be in (0, " + MAX_WINDOW_DURATION + "] s, got "
-            + windowDuration);
-      }
-      if (frameSize(windowDuration, sampleRate, basebandDecimationFactor) <= 0) {
-        throw Checks.fail("windowDuration " + windowDuration + " s gives no samples per frame at "
-            + sampleRate + " Hz with basebandDecimationFactor " + basebandDecimationFactor);
-      }
-      float[] tones = toneFrequencies.length == 0 ? DEFAULT_TONES : toneFrequencies;
-      if (tones.length > MAX_TONES) {
-        throw Checks.fail("toneFrequencies may hold at most " + MAX_TONES + " tones, got "
-            + tones.length);
-      }
-      final float nyquist = sampleRate * 0.5f;
-      for (float f : tones) {
-        if (!(f >= 0f && f < nyquist)) {
-          throw Checks.fail("toneFrequencies: " + f + " Hz must be in [0, " + nyquist + ")");
-        }
-      }
-      final int n = tones.length;
-      Checks.intIn("tonesPerSymbol", tonesPerSymbol, 1, n);
-      if (toneFrequencies.length == 0) {
-        if (tonesPerSymbol != 2) {
-          throw Checks.fail("tonesPerSymbol must be 2 with the default tones (set "
-              + "toneFrequencies to change it), got " + tonesPerSymbol);
-        }
-      } else {
-        long symbols = symbolCount(n, tonesPerSymbol);
-        long most = (long) n * (n - 1) / 2;
-        if (symbols < 3 || symbols > most) {
-          throw Checks.fail("toneFrequencies and tonesPerSymbol: " + n + " tones taken "
-              + tonesPerSymbol + " at a time must give between 3 and " + most + " symbols");
-        }
-      }
+      // Unless set, the window scales with the frame.
       float[] window = adsr != null
           ? adsr.clone()
           : new float[] {0.1f * windowDuration, 0.1f * windowDuration, 0.6f * windowDuration,
               0.1f * windowDuration, 0.5f};
-      checkAdsr(window, windowDuration);
-      Checks.intIn("maxCandidatesPerDecodeTokenCall", maxCandidatesPerDecodeTokenCall, 1,
-          Checks.MAX_CANDIDATES);
-      return new DtmfSettings(this, window);
-    }
-
-    private static void checkAdsr(float[] a, float windowDuration) {
-      final String[] names = {"attack", "decay", "sustain", "release"};
-      for (int i = 0; i < 4; i++) {
-        if (!(a[i] >= 0f && a[i] <= Float.MAX_VALUE)) {
-          throw Checks.fail("adsr " + names[i] + " must be a duration of 0 s or more, got " + a[i]);
-        }
-      }
-      Checks.floatIn("adsr sustainAmplitude", a[4], 0f, 1f);
-      // Summed in this order with the library's few ulps of slack.
-      float total = a[0] + a[1] + a[2] + a[3];
-      if (total > windowDuration * 1.0000005f) {
-        throw Checks.fail("adsr: attack + decay + sustain + release (" + total
-            + " s) must be at most windowDuration (" + windowDuration + " s), got "
-            + Arrays.toString(a));
-      }
+      DtmfSettings settings = new DtmfSettings(this, window);
+      NativeSettings.require(settings.objection(false, sampleRate, 1));
+      return settings;
     }
   }
 }

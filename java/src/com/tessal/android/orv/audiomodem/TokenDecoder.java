@@ -41,11 +41,6 @@ import java.util.concurrent.locks.ReentrantReadWriteLock;
  * memory and id for the life of the process.
  */
 public final class TokenDecoder implements AutoCloseable {
-  /** The hotsound detector's carrier and half bandwidth, Hz, as the library builds it. */
-  static final double HOTSOUND_CARRIER_HZ = 18496.0625;
-  static final double HOTSOUND_HALF_BAND_HZ = 2000.0;
-  /** Channels this API accepts. */
-  static final int MAX_CHANNELS = 8;
   /** Samples copied per native call from arrays and heap buffers. */
   private static final int SCRATCH_SAMPLES = 8192;
 
@@ -85,7 +80,7 @@ public final class TokenDecoder implements AutoCloseable {
     try {
       id = IDS_IN_USE.nextClearBit(0);
       if (!initialize(id, b)) {
-        // The settings' checks mirror the library's; the registry is unchanged.
+        // The library took these settings when they were checked; the registry is unchanged.
         throw new IllegalStateException("the library refused checked settings");
       }
       IDS_IN_USE.set(id);
@@ -165,7 +160,7 @@ public final class TokenDecoder implements AutoCloseable {
     Objects.requireNonNull(buffer, "buffer");
     final int bytes = buffer.remaining();
     if (bytes % 2 != 0) {
-      throw Checks.fail("buffer must hold whole 16-bit samples, got " + bytes + " bytes");
+      throw new IllegalArgumentException("buffer must hold whole 16-bit samples, got " + bytes + " bytes");
     }
     checkFrames(bytes / 2);
     final int start = buffer.position();
@@ -249,7 +244,7 @@ public final class TokenDecoder implements AutoCloseable {
 
   private void checkFrames(int samples) {
     if (samples % channels != 0) {
-      throw Checks.fail(samples + " samples are not whole frames of " + channels + " channels");
+      throw new IllegalArgumentException(samples + " samples are not whole frames of " + channels + " channels");
     }
   }
 
@@ -303,25 +298,14 @@ public final class TokenDecoder implements AutoCloseable {
 
     /** Checks the settings and sets up the native decoder. */
     public TokenDecoder build() {
-      Checks.rate("inputSampleRate", inputSampleRate);
-      Checks.intIn("channels", channels, 1, MAX_CHANNELS);
-      TokenEncoder.messageBytes(dsss != null ? dsss.tokenLengthBytes() : dtmf.bytesInToken(), crc);
-      if (hotsound) {
-        if (dsss == null) throw Checks.fail("hotsound needs DSSS settings");
-        checkHotsoundRate(inputSampleRate);
+      if (hotsound && dsss == null) {
+        throw new IllegalArgumentException("hotsound works with DsssSettings only");
       }
+      NativeSettings.require(dsss != null
+          ? dsss.objection(crc, inputSampleRate, channels, hotsound)
+          : dtmf.objection(crc, inputSampleRate, channels));
       return new TokenDecoder(this);
     }
   }
 
-  /** The detector is built for the whole-Hz rate and needs its band below half of it. */
-  static void checkHotsoundRate(float inputSampleRate) {
-    double rate = Math.floor(inputSampleRate);
-    if (!(HOTSOUND_CARRIER_HZ + HOTSOUND_HALF_BAND_HZ < rate / 2.0)) {
-      int needed = (int) (2 * (HOTSOUND_CARRIER_HZ + HOTSOUND_HALF_BAND_HZ)) + 1;
-      throw Checks.fail("hotsound needs an inputSampleRate of at least " + needed + " Hz (the "
-          + Math.round(HOTSOUND_CARRIER_HZ) + " Hz carrier and its band), got " + inputSampleRate
-          + " Hz");
-    }
-  }
 }

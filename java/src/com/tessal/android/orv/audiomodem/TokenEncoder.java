@@ -37,15 +37,14 @@ public final class TokenEncoder {
     this.dsss = dsss;
     this.dtmf = dtmf;
     this.crc = crc;
+    // The settings passed on their own; the CRC may still leave no message bytes.
+    NativeSettings.require(dsss != null ? dsss.objection(crc, dsss.sampleRate(), 1, false)
+        : dtmf.objection(crc, dtmf.sampleRate(), 1));
     this.messageBytes = messageBytes(tokenBytes, crc);
   }
 
-  /** Message bytes per token; throws when CRC leaves none. */
+  /** Message bytes per token of settings the library took. */
   static int messageBytes(int tokenBytes, boolean crc) {
-    if (crc && tokenBytes < 3) {
-      throw Checks.fail("crc needs a token of at least 3 bytes (2 CRC bytes and a message "
-          + "byte), got " + tokenBytes);
-    }
     return crc ? tokenBytes - 2 : tokenBytes;
   }
 
@@ -69,7 +68,7 @@ public final class TokenEncoder {
   public short[] encode(byte[] message) {
     Objects.requireNonNull(message, "message");
     if (message.length != messageBytes) {
-      throw Checks.fail("message must be " + messageBytes + " bytes long, got "
+      throw new IllegalArgumentException("message must be " + messageBytes + " bytes long, got "
           + message.length);
     }
     EncodeResults results = new EncodeResults();
@@ -90,7 +89,7 @@ public final class TokenEncoder {
             dtmf.toneFrequencies(), dtmf.sampleRate(), dtmf.windowDuration(), a[0], a[1], a[2],
             a[3], a[4]);
       }
-      // The settings' checks mirror the library's, so a refusal here is a bug.
+      // The library took these settings when they were checked, so a refusal is a bug.
       if (!ready) throw new IllegalStateException("the library refused checked settings");
       try {
         NativeEncoder.nativeEncode(message, results, crc ? 2 : 0);
