@@ -74,6 +74,12 @@ constexpr float kMaxWindowDuration = 1.0f;
 constexpr int kMaxChannels = 8;
 // The decoders rank six candidates (max_candidates_rank).
 constexpr int kMaxCandidates = 6;
+// Audio a receiver holds, in token durations. Blocks up to the buffer less
+// one token go in whole; below two tokens that leaves under a token for
+// blocks, and below one every block is cut with a warning. The fuzzers take
+// the library from a quarter of a token to twelve.
+constexpr float kMinBufferTokens = 2.0f;
+constexpr float kMaxBufferTokens = 12.0f;
 
 std::string RateProblem(const char* name, float hz) {
   if (hz >= kMinRateHz && hz <= kMaxRateHz) return "";
@@ -325,11 +331,10 @@ std::string CheckReceiverSettings(const ModemSettings& modem, const ReceiverSett
   if (!(r.detection_threshold >= 0.0f) || !std::isfinite(r.detection_threshold)) {
     return StrCat("detection_threshold must not be negative, got ", r.detection_threshold);
   }
-  // The fuzzers cover 0.25 to 12 token durations.
-  if (r.buffer_duration_factor &&
-      !(*r.buffer_duration_factor >= 0.25f && *r.buffer_duration_factor <= 12.0f)) {
-    return StrCat("buffer_duration_factor must be in [0.25, 12], got ",
-                  *r.buffer_duration_factor);
+  if (r.buffer_duration_factor && !(*r.buffer_duration_factor >= kMinBufferTokens &&
+                                     *r.buffer_duration_factor <= kMaxBufferTokens)) {
+    return StrCat("buffer_duration_factor must be in [", kMinBufferTokens, ", ",
+                  kMaxBufferTokens, "], got ", *r.buffer_duration_factor);
   }
   if (r.hotsound && !modem.is_dsss()) return "hotsound works with the dsss scheme";
   if (r.hotsound) {
