@@ -25,6 +25,18 @@ std::string Objection(ModemSettings modem, int max_candidates, float input_sampl
   return audio_sorvane::CheckReceiverSettings(modem, receiver, input_sample_rate, channels);
 }
 
+// The settings both schemes share.
+ModemSettings Modem(const char* scheme, bool crc, int token_bytes, int decimation_factor,
+                    float sample_rate) {
+  ModemSettings modem;
+  modem.scheme = scheme;
+  modem.crc = crc;
+  modem.token_bytes = token_bytes;
+  modem.decimation_factor = decimation_factor;
+  modem.dsss.coder.sample_rate = sample_rate;  // the frame rate of either scheme
+  return modem;
+}
+
 jstring ToJava(JNIEnv* env, const std::string& objection) {
   return objection.empty() ? nullptr : env->NewStringUTF(objection.c_str());
 }
@@ -40,11 +52,8 @@ JNIEXPORT jstring JNICALL Java_com_tessal_android_orv_audiomodem_NativeSettings_
     jfloat sample_rate, jfloat desired_carrier_frequency, jint broadcast_sample_rate,
     jfloat start_transition_duration, jint max_candidates, jfloat input_sample_rate,
     jint channels, jboolean hotsound) {
-  ModemSettings modem;
-  modem.scheme = "dsss";
-  modem.crc = crc;
-  modem.token_bytes = token_length_bytes;
-  modem.decimation_factor = baseband_decimation_factor;
+  ModemSettings modem =
+      Modem("dsss", crc, token_length_bytes, baseband_decimation_factor, sample_rate);
   modem.dsss.coder = audio_sorvane::MakeDsssCoderConfig(
       number_of_taps, code_number, upsampling_factor, bits_per_symbol, min_cycles_per_frame,
       baseband_decimation_factor, use_quadrature, sample_rate, desired_carrier_frequency);
@@ -59,12 +68,8 @@ JNIEXPORT jstring JNICALL Java_com_tessal_android_orv_audiomodem_NativeSettings_
     jint baseband_decimation_factor, jint tones_per_symbol, jfloatArray tone_frequencies,
     jfloat sample_rate, jfloat window_duration, jfloatArray adsr, jint max_candidates,
     jfloat input_sample_rate, jint channels) {
-  ModemSettings modem;
-  modem.scheme = "dtmf";
-  modem.crc = crc;
-  modem.token_bytes = bytes_in_token;
-  modem.decimation_factor = baseband_decimation_factor;
-  modem.dsss.coder.sample_rate = sample_rate;  // the frame rate of either scheme
+  ModemSettings modem =
+      Modem("dtmf", crc, bytes_in_token, baseband_decimation_factor, sample_rate);
   modem.dtmf.use_checksum_symbol = use_checksum_symbol;
   modem.dtmf.tones_per_symbol = tones_per_symbol;
   modem.dtmf.window_duration = window_duration;
