@@ -55,8 +55,11 @@ void AudioModemDecoder::ProcessSamples(std::span<const float> samples) {
     case kHotsound:
       int16_samples_.resize(samples.size());
       for (size_t i = 0; i < samples.size(); ++i) {
-        int16_samples_[i] = static_cast<int16_t>(
-            std::clamp(std::trunc(samples[i]), -32768.0f, 32767.0f));
+        // Clamped (NaN to -32768) and then truncated by the conversion: the
+        // same values as std::trunc, without its library call per sample.
+        float v = samples[i] > -32768.0f ? samples[i] : -32768.0f;
+        v = v < 32767.0f ? v : 32767.0f;
+        int16_samples_[i] = static_cast<int16_t>(static_cast<int32_t>(v));
       }
       hotsound_decoder_->ProcessSamples(int16_samples_.data(),
                                         static_cast<int>(int16_samples_.size()));
@@ -65,6 +68,11 @@ void AudioModemDecoder::ProcessSamples(std::span<const float> samples) {
 }
 
 void AudioModemDecoder::ProcessPcm16(const int16_t* samples, int count) {
+  // The detector takes 16-bit samples as they are.
+  if (kind_ == kHotsound) {
+    hotsound_decoder_->ProcessSamples(samples, std::max(count, 0));
+    return;
+  }
   float_samples_.assign(samples, samples + std::max(count, 0));
   ProcessSamples(float_samples_);
 }

@@ -9,6 +9,7 @@
 #include <memory>
 #include <set>
 #include <string>
+#include <type_traits>
 #include <vector>
 
 #include "audio/audio_modem_decoder.h"
@@ -26,8 +27,10 @@ struct DecodeOptions {
   int raw_channels = 1;
 };
 
-// Reads interleaved frames on the 16-bit scale from a sound file or from
-// raw 16-bit little-endian PCM on standard input.
+// Reads interleaved frames from a sound file or from raw 16-bit
+// little-endian PCM on standard input: as 16-bit samples where that is what
+// the input holds (raw input, 16-bit PCM files), else as floats on the
+// 16-bit scale.
 class AudioSource {
  public:
   ~AudioSource() {
@@ -46,30 +49,31 @@ class AudioSource {
     if (file_ == nullptr) return "cannot read " + o.input + ": " + sf_strerror(nullptr);
     rate_ = static_cast<float>(info.samplerate);
     channels_ = info.channels;
+    file_pcm16_ = (info.format & SF_FORMAT_SUBMASK) == SF_FORMAT_PCM_16;
     return "";
   }
 
+  // Whether Read gives 16-bit samples.
+  bool pcm16() const { return file_ == nullptr || file_pcm16_; }
+
   // Up to `frames` frames; fewer (possibly none) at the end of the input.
-  void Read(size_t frames, std::vector<float>* samples) {
+  template <typename Sample>
+  void Read(size_t frames, std::vector<Sample>* samples) {
     samples->resize(frames * channels_);
     size_t got = 0;
     if (file_ != nullptr) {
+      std::vector<Sample>& chunk = Chunk(samples);
       // Files are read a few hundred milliseconds at a time (one read per
       // block cost more system time than a DTMF decoder spends on it) and
       // handed out in blocks.
-      if (next_ == chunk_.size()) {
+      if (next_ == chunk.size()) {
         const size_t chunk_frames = 32 * frames;
-        chunk_.resize(chunk_frames * channels_);
-        // Float reads keep any format's full resolution (short reads of a
-        // float file return only -1, 0 and 1); scale to the 16-bit range.
-        const size_t read = static_cast<size_t>(sf_readf_float(
-            file_, chunk_.data(), static_cast<sf_count_t>(chunk_frames)));
-        chunk_.resize(read * channels_);
-        for (float& v : chunk_) v = std::clamp(v * 32768.0f, -32768.0f, 32767.0f);
+        chunk.resize(chunk_frames * channels_);
+        chunk.resize(ReadFile(chunk.data(), chunk_frames) * channels_);
         next_ = 0;
       }
-      const size_t n = std::min(frames * channels_, chunk_.size() - next_);
-      std::copy_n(chunk_.begin() + static_cast<std::ptrdiff_t>(next_), n, samples->begin());
+      const size_t n = std::min(frames * channels_, chunk.size() - next_);
+      std::copy_n(chunk.begin() + static_cast<std::ptrdiff_t>(next_), n, samples->begin());
       next_ += n;
       got = n / channels_;
     } else {
@@ -87,13 +91,49 @@ class AudioSource {
   int channels() const { return channels_; }
 
  private:
+  std::vector<float>& Chunk(std::vector<float>*) { return float_chunk_; }
+  std::vector<int16_t>& Chunk(std::vector<int16_t>*) { return pcm16_chunk_; }
+
+  size_t ReadFile(int16_t* to, size_t frames) {
+    return static_cast<size_t>(sf_readf_short(file_, to, static_cast<sf_count_t>(frames)));
+  }
+  // Float reads keep any other format's full resolution (short reads of a
+  // float file return only -1, 0 and 1); scaled to the 16-bit range.
+  size_t ReadFile(float* to, size_t frames) {
+    const auto read =
+        static_cast<size_t>(sf_readf_float(file_, to, static_cast<sf_count_t>(frames)));
+    for (size_t i = 0; i < read * channels_; ++i) {
+      to[i] = std::clamp(to[i] * 32768.0f, -32768.0f, 32767.0f);
+    }
+    return read;
+  }
+
   SNDFILE* file_ = nullptr;
+  bool file_pcm16_ = false;
   float rate_ = 0.0f;
   int channels_ = 1;
   std::vector<uint8_t> raw_;
-  std::vector<float> chunk_;  // file samples read ahead, from next_ on
+  // File samples read ahead, from next_ on (one of the two is used).
+  std::vector<float> float_chunk_;
+  std::vector<int16_t> pcm16_chunk_;
   size_t next_ = 0;
 };
+
+// Reads `source` to its end in 10 ms blocks of `Sample`s into `decoder`.
+template <typename Sample>
+void DecodeAll(AudioSource& source, StreamDecoder& decoder) {
+  const size_t block_frames = std::max<size_t>(1, static_cast<size_t>(source.rate() / 100));
+  std::vector<Sample> block;
+  while (true) {
+    source.Read(block_frames, &block);
+    if (block.empty()) break;
+    if constexpr (std::is_same_v<Sample, int16_t>) {
+      decoder.FeedPcm16(block);
+    } else {
+      decoder.Feed(block);
+    }
+  }
+}
 
 int Run(DecodeOptions& o) {
   AudioSource source;
@@ -105,12 +145,10 @@ int Run(DecodeOptions& o) {
     std::cerr << "sorvel decode: " << error << "\n";
     return kUsageError;
   }
-  const size_t block_frames = std::max<size_t>(1, static_cast<size_t>(source.rate() / 100));
-  std::vector<float> block;
-  while (true) {
-    source.Read(block_frames, &block);
-    if (block.empty()) break;
-    decoder.Feed(block);
+  if (source.pcm16()) {
+    DecodeAll<int16_t>(source, decoder);
+  } else {
+    DecodeAll<float>(source, decoder);
   }
   return decoder.Finish() > 0 ? 0 : 1;
 }
@@ -161,7 +199,16 @@ std::string StreamDecoder::Start(const ModemOptions& modem, const ReceiverOption
 
 void StreamDecoder::Feed(std::span<const float> samples) {
   decoder_->ProcessSamples(samples);
-  frames_ += static_cast<int64_t>(samples.size()) / channels_;
+  Advance(static_cast<int64_t>(samples.size()) / channels_);
+}
+
+void StreamDecoder::FeedPcm16(std::span<const int16_t> samples) {
+  decoder_->ProcessPcm16(samples.data(), static_cast<int>(samples.size()));
+  Advance(static_cast<int64_t>(samples.size()) / channels_);
+}
+
+void StreamDecoder::Advance(int64_t frames) {
+  frames_ += frames;
   const double now = frames_ / static_cast<double>(rate_);
   if (now >= next_request_) {
     Request(now);

@@ -34,6 +34,8 @@ class StreamDecoder {
                     int channels);
   // Interleaved samples on the 16-bit scale.
   void Feed(std::span<const float> samples);
+  // Interleaved 16-bit samples.
+  void FeedPcm16(std::span<const int16_t> samples);
   // A last request; returns the number of distinct tokens found.
   int Finish();
   // Stream time of the first best-ranked token, or a negative value.
@@ -41,6 +43,8 @@ class StreamDecoder {
 
  private:
   void Request(double now);
+  // Counts `frames` more frames and asks for tokens when an interval is due.
+  void Advance(int64_t frames);
 
   ModemOptions modem_;
   ReceiverOptions receiver_;
