@@ -61,6 +61,16 @@ constexpr int kPad = 4;
 
 audio_dsp::Float4 Max(audio_dsp::Float4 a, audio_dsp::Float4 b) { return a > b ? a : b; }
 
+// The sum of n floats, four lanes at a time (a serial sum waits on each add).
+float Sum(const float* x, int n) {
+  audio_dsp::Float4 lanes = {};
+  int i = 0;
+  for (; i + 4 <= n; i += 4) lanes += audio_dsp::Load4(x + i);
+  float sum = audio_dsp::Sum4(lanes);
+  for (; i < n; ++i) sum += x[i];
+  return sum;
+}
+
 double Blackman(double x) {  // x in [-1, 1]
   return 0.42 + 0.5 * std::cos(std::numbers::pi * x) + 0.08 * std::cos(2 * std::numbers::pi * x);
 }
@@ -120,27 +130,33 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
 
   // The code band-limited to its chips' bins (|k| < chips / 2) and seen at
   // kN samples per frame: its spectrum is the chips' DFT on those bins.
-  code_re_.assign(kN, 0.0f);
-  code_im_.assign(kN, 0.0f);
-  for (int k = -(chips / 2); k <= chips / 2; ++k) {
+  half_band_ = chips / 2;
+  product_size_ = (2 * half_band_ + 1 + 3) / 4 * 4;
+  CHECK(product_size_ <= kN);
+  code_re_.assign(product_size_, 0.0f);
+  code_im_.assign(product_size_, 0.0f);
+  for (int k = -half_band_; k <= half_band_; ++k) {
     std::complex<double> sum = 0.0;
     for (int n = 0; n < chips; ++n) {
       sum += static_cast<double>(coder.code[n]) *
              std::polar(1.0, -2.0 * std::numbers::pi * k * n / chips);
     }
-    const int bin = (k + kN) % kN;
     const std::complex<double> value = std::conj(sum) / std::sqrt(double(chips));
-    code_re_[bin] = static_cast<float>(value.real());
-    code_im_[bin] = static_cast<float>(value.imag());
-    code_bins_.push_back(bin);
+    code_re_[k + half_band_] = static_cast<float>(value.real());
+    code_im_[k + half_band_] = static_cast<float>(value.imag());
   }
 
   window_.resize(window_size_);
-  for (auto* v : {&base_re_, &base_im_, &spec_re_, &spec_im_, &half_re_, &half_im_}) v->resize(kN);
+  for (auto* v : {&base_re_, &base_im_, &spec_re_, &spec_im_}) v->resize(kN);
+  // Centred spectra, with room for the products' reads past the band.
+  for (auto* v : {&whole_re_, &whole_im_, &half_re_, &half_im_}) {
+    v->assign(product_size_ + 2 * kMaxShift + 4, 0.0f);
+  }
   for (int m = 0; m < kN; ++m) {
     half_turn_re_.push_back(static_cast<float>(std::cos(std::numbers::pi * m / kN)));
     half_turn_im_.push_back(static_cast<float>(-std::sin(std::numbers::pi * m / kN)));
   }
+  // Products fill the first product_size_ bins; the rest stay zero.
   prod_re_.assign(kN, 0.0f);
   prod_im_.assign(kN, 0.0f);
   // A phone moving at v compresses the broadcast by v / c: the code's lag
@@ -165,11 +181,10 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
     }
     f.ring.assign(kLongWindows, std::vector<float>(kCarrierOffsets * f.lags, 0.0f));
     f.short_tracks.assign(kLongWindows, std::vector<float>(kCarrierOffsets * f.row, 0.0f));
-    f.long_track.assign(kCarrierOffsets * f.row, 0.0f);
   }
+  for (auto* v : {&track_a_, &track_b_, &track_c_}) v->assign(kCarrierOffsets * families_[0].row, 0.0f);
   scales_.assign(kLongWindows, 0.0f);
-  powers_.resize(kN);
-  static_assert(kSpreadStride == 4 && kN % kSpreadStride == 0);
+  static_assert(kSpreadStride == 4 && kN % 16 == 0 && kSpreadLags % 16 == 0);
   pooled_.resize(kN);
 }
 
@@ -208,30 +223,45 @@ float HotsoundDetector::Process(std::span<int16_t> samples) {
   return best >= 0.0f ? best : score_;
 }
 
-void HotsoundDetector::ScoreWindow() {
-  // Mix down and low-pass to kN complex samples.
-  double energy = 0.0;
-  float peak = 0.0f;
-  for (int m = 0; m < kN; ++m) {
-    const float* x = window_.data() + tap_start_[m];
-    const float* re = taps_re_.data() + static_cast<size_t>(m) * taps_;
-    const float* im = taps_im_.data() + static_cast<size_t>(m) * taps_;
-    using audio_dsp::Load4;
-    audio_dsp::Float4 r0 = {}, r1 = {}, i0 = {}, i1 = {};
-    for (int t = 0; t < taps_; t += 8) {
-      const audio_dsp::Float4 x0 = Load4(x + t), x1 = Load4(x + t + 4);
-      r0 += x0 * Load4(re + t);
-      r1 += x1 * Load4(re + t + 4);
-      i0 += x0 * Load4(im + t);
-      i1 += x1 * Load4(im + t + 4);
+void HotsoundDetector::MixDown(float* energy, float* peak) {
+  // Four baseband samples at a time, their tap sums reduced together.
+  using audio_dsp::Float4;
+  using audio_dsp::Load4;
+  Float4 total = {}, top = {};
+  for (int m = 0; m < kN; m += 4) {
+    Float4 re[4], im[4];
+    for (int j = 0; j < 4; ++j) {
+      const float* x = window_.data() + tap_start_[m + j];
+      const float* tr = taps_re_.data() + static_cast<size_t>(m + j) * taps_;
+      const float* ti = taps_im_.data() + static_cast<size_t>(m + j) * taps_;
+      Float4 r0 = {}, r1 = {}, i0 = {}, i1 = {};
+      for (int t = 0; t < taps_; t += 8) {
+        const Float4 x0 = Load4(x + t), x1 = Load4(x + t + 4);
+        r0 += x0 * Load4(tr + t);
+        r1 += x1 * Load4(tr + t + 4);
+        i0 += x0 * Load4(ti + t);
+        i1 += x1 * Load4(ti + t + 4);
+      }
+      re[j] = r0 + r1;
+      im[j] = i0 + i1;
     }
-    const float sr = audio_dsp::Sum4(r0 + r1), si = audio_dsp::Sum4(i0 + i1);
-    base_re_[m] = sr;
-    base_im_[m] = si;
-    const float power = sr * sr + si * si;
-    energy += power;
-    peak = std::max(peak, power);
+    audio_dsp::Transpose4(re[0], re[1], re[2], re[3]);
+    audio_dsp::Transpose4(im[0], im[1], im[2], im[3]);
+    const Float4 sr = (re[0] + re[1]) + (re[2] + re[3]);
+    const Float4 si = (im[0] + im[1]) + (im[2] + im[3]);
+    audio_dsp::Store4(&base_re_[m], sr);
+    audio_dsp::Store4(&base_im_[m], si);
+    const Float4 power = sr * sr + si * si;
+    total += power;
+    top = audio_dsp::Max4(top, power);
   }
+  *energy = audio_dsp::Sum4(total);
+  *peak = audio_dsp::MaxLane4(top);
+}
+
+void HotsoundDetector::ScoreWindow() {
+  float energy = 0.0f, peak = 0.0f;
+  MixDown(&energy, &peak);
 
   const int slot = ring_next_;
   ring_next_ = (ring_next_ + 1) % kLongWindows;
@@ -241,56 +271,44 @@ void HotsoundDetector::ScoreWindow() {
   float scale = 0.0f;
   if (energy >= kSilentPower * kN && peak < kMaxCrest * energy / kN) {
     fft_.Forward(base_re_.data(), base_im_.data(), spec_re_.data(), spec_im_.data());
+    Condition(spec_re_.data(), spec_im_.data(), whole_re_.data(), whole_im_.data());
     // The same window half a bin lower, so its spectrum reads half a bin up.
     for (int m = 0; m < kN; ++m) {
       const float re = base_re_[m], im = base_im_[m];
       base_re_[m] = re * half_turn_re_[m] - im * half_turn_im_[m];
       base_im_[m] = re * half_turn_im_[m] + im * half_turn_re_[m];
     }
-    fft_.Forward(base_re_.data(), base_im_.data(), half_re_.data(), half_im_.data());
-    Condition(spec_re_.data(), spec_im_.data());
-    Condition(half_re_.data(), half_im_.data());
+    fft_.Forward(base_re_.data(), base_im_.data(), spec_re_.data(), spec_im_.data());
+    Condition(spec_re_.data(), spec_im_.data(), half_re_.data(), half_im_.data());
     // Correlation powers per offset; their total from the products (the
     // inverse transform is unnormalised: sum |c|^2 = kN sum |product|^2).
-    double total = 0.0;
+    // The products sit from bin 0 rather than around it: a cyclic shift of
+    // the spectrum turns the lags' phases but not their powers.
+    using audio_dsp::Float4;
+    using audio_dsp::Load4;
+    Float4 total = {};
     for (int d = 0; d < kCarrierOffsets; ++d) {
       const int shift = static_cast<int>(std::floor(kOffsetBins[d]));
       const bool half = kOffsetBins[d] != shift;
-      const float* x_re = half ? half_re_.data() : spec_re_.data();
-      const float* x_im = half ? half_im_.data() : spec_im_.data();
-      for (int bin : code_bins_) {
-        const int from = (bin + shift + kN) % kN;
-        const float re = x_re[from] * code_re_[bin] - x_im[from] * code_im_[bin];
-        const float im = x_re[from] * code_im_[bin] + x_im[from] * code_re_[bin];
-        prod_re_[bin] = re;
-        prod_im_[bin] = im;
+      const float* x_re = (half ? half_re_.data() : whole_re_.data()) + kMaxShift + shift;
+      const float* x_im = (half ? half_im_.data() : whole_im_.data()) + kMaxShift + shift;
+      for (int i = 0; i < product_size_; i += 4) {
+        const Float4 a = Load4(x_re + i), b = Load4(x_im + i);
+        const Float4 c = Load4(&code_re_[i]), e = Load4(&code_im_[i]);
+        const Float4 re = a * c - b * e, im = a * e + b * c;
+        audio_dsp::Store4(&prod_re_[i], re);
+        audio_dsp::Store4(&prod_im_[i], im);
         total += re * re + im * im;
       }
       fft_.Inverse(prod_re_.data(), prod_im_.data(), base_re_.data(), base_im_.data());
-      float* powers = powers_.data();
+      float* powers = families_[0].ring[slot].data() + d * kN;
       for (int t = 0; t < kN; t += 4) {
-        const audio_dsp::Float4 re = audio_dsp::Load4(&base_re_[t]), im = audio_dsp::Load4(&base_im_[t]);
+        const Float4 re = Load4(&base_re_[t]), im = Load4(&base_im_[t]);
         audio_dsp::Store4(powers + t, re * re + im * im);
       }
-      std::copy(powers, powers + kN, families_[0].ring[slot].data() + d * kN);
-      // Sums of kSpreadLags lags every kSpreadStride lags, from sums of
-      // kSpreadStride consecutive lags.
-      const Family& spread = families_[1];
-      float* out = families_[1].ring[slot].data() + d * spread.lags;
-      for (int j = 0; j < spread.lags; ++j) {
-        const float* p = powers + j * kSpreadStride;
-        pooled_[j] = (p[0] + p[1]) + (p[2] + p[3]);
-      }
-      constexpr int kGroups = kSpreadLags / kSpreadStride;
-      std::copy(pooled_.begin(), pooled_.begin() + kGroups, pooled_.begin() + spread.lags);  // cyclic
-      float sum = 0.0f;
-      for (int j = 0; j < kGroups; ++j) sum += pooled_[j];
-      for (int j = 0; j < spread.lags; ++j) {
-        out[j] = sum;
-        sum += pooled_[j + kGroups] - pooled_[j];
-      }
+      PoolSpread(powers, families_[1].ring[slot].data() + d * families_[1].lags);
     }
-    scale = static_cast<float>(kCarrierOffsets / total);
+    scale = kCarrierOffsets / audio_dsp::Sum4(total);
   }
   scales_[slot] = scale;
 
@@ -300,20 +318,58 @@ void HotsoundDetector::ScoreWindow() {
   score_ = kThreshold * best;
 }
 
-void HotsoundDetector::Condition(float* spec_re, float* spec_im) const {
-  // Bins -reach .. reach around the carrier, the only ones read; negative
-  // frequencies sit at the end of the arrays.
-  const int half_band = static_cast<int>(code_bins_.size()) / 2;
-  const int reach = half_band + kMaxShift;
-  float power[2 * (kN / 2)];
-  const auto index = [](int f) { return f < 0 ? f + kN : f; };
-  double band = 0.0;
-  for (int f = -reach; f <= reach; ++f) {
-    const int k = index(f);
-    power[f + reach] = spec_re[k] * spec_re[k] + spec_im[k] * spec_im[k];
-    if (f >= -half_band && f <= half_band) band += power[f + reach];
+void HotsoundDetector::PoolSpread(const float* powers, float* out) {
+  using audio_dsp::Float4;
+  using audio_dsp::Load4;
+  // pooled_[j]: the sum of kSpreadStride consecutive lags from j * stride,
+  // with kSpreadLags lags of cyclic continuation; then sums of four of those
+  // in a row; then each output adds every fourth of the latter.
+  constexpr int kLags = kN / kSpreadStride;
+  constexpr int kGroups = kSpreadLags / kSpreadStride;
+  float* pooled = pooled_.data();
+  for (int t = 0; t < kN; t += 16) {
+    Float4 a = Load4(powers + t), b = Load4(powers + t + 4), c = Load4(powers + t + 8),
+           e = Load4(powers + t + 12);
+    audio_dsp::Transpose4(a, b, c, e);
+    audio_dsp::Store4(pooled + t / 4, (a + b) + (c + e));
   }
-  const float band_mean = static_cast<float>(band / code_bins_.size());
+  std::copy(pooled, pooled + kGroups, pooled + kLags);
+  float* quads = pooled + kLags + kGroups;  // kLags + kGroups - 4 sums of four groups
+  for (int j = 0; j < kLags + kGroups - 4; j += 4) {
+    audio_dsp::Store4(quads + j, (Load4(pooled + j) + Load4(pooled + j + 1)) +
+                                     (Load4(pooled + j + 2) + Load4(pooled + j + 3)));
+  }
+  for (int j = 0; j < kLags; j += 4) {
+    Float4 sum = {};
+    for (int k = 0; k < kGroups; k += 4) sum += Load4(quads + j + k);
+    audio_dsp::Store4(out + j, sum);
+  }
+}
+
+void HotsoundDetector::Condition(const float* spec_re, const float* spec_im, float* out_re,
+                                 float* out_im) const {
+  // Bins -reach .. reach around the carrier, the only ones read; negative
+  // frequencies sit at the end of the input arrays.
+  const int half_band = half_band_;
+  const int reach = half_band + kMaxShift;
+  const int width = 2 * reach + 1;
+  std::copy(spec_re + kN - reach, spec_re + kN, out_re);
+  std::copy(spec_im + kN - reach, spec_im + kN, out_im);
+  std::copy(spec_re, spec_re + reach + 1, out_re + reach);
+  std::copy(spec_im, spec_im + reach + 1, out_im + reach);
+  // Powers of the centred bins (the outputs are zero past `width`).
+  using audio_dsp::Float4;
+  float power[kN];
+  Float4 all = {};
+  for (int i = 0; i < width; i += 4) {
+    const Float4 re = audio_dsp::Load4(out_re + i), im = audio_dsp::Load4(out_im + i);
+    const Float4 p = re * re + im * im;
+    audio_dsp::Store4(power + i, p);
+    all += p;
+  }
+  float band = audio_dsp::Sum4(all);
+  for (int i = 0; i < kMaxShift; ++i) band -= power[i] + power[width - 1 - i];
+  const float band_mean = std::max(band, 0.0f) / static_cast<float>(2 * half_band + 1);
   // Each block of kWhiteningBlock bins is brought to the band's mean (a
   // microphone's roll-off tilts the band, and music through it would
   // otherwise correlate with the code into smooth lag profiles; the outer
@@ -323,21 +379,25 @@ void HotsoundDetector::Condition(float* spec_re, float* spec_im) const {
   // lag profiles that the spread statistic would take for a room. Noise and
   // the code rarely get there.
   const float ceiling = kMaxBinPower * band_mean;
+  float gains[kN], amplitudes[kN];  // per centred bin: its block's power and amplitude gain
+  std::fill(gains + width, gains + (width + 3) / 4 * 4, 0.0f);
+  std::fill(amplitudes + width, amplitudes + (width + 3) / 4 * 4, 0.0f);
   for (int lo = -half_band; lo < half_band; lo += kWhiteningBlock) {
     const int first = lo == -half_band ? -reach : lo;
     const int last = lo + kWhiteningBlock >= half_band ? reach : lo + kWhiteningBlock - 1;
-    float block = 0.0f;
-    for (int f = first; f <= last; ++f) block += power[f + reach];
-    if (!(block > 0.0f)) continue;
-    const float gain = band_mean * static_cast<float>(last - first + 1) / block;  // of power
-    const float amplitude_gain = std::sqrt(gain);
-    for (int f = first; f <= last; ++f) {
-      const float p = power[f + reach] * gain;
-      const float g = p > ceiling ? std::sqrt(gain * ceiling / p) : amplitude_gain;
-      const int k = index(f);
-      spec_re[k] *= g;
-      spec_im[k] *= g;
-    }
+    const float block = Sum(power + first + reach, last - first + 1);
+    // A block without power stays as it is (zero).
+    const float gain = block > 0.0f ? band_mean * static_cast<float>(last - first + 1) / block : 1.0f;
+    std::fill(gains + first + reach, gains + last + reach + 1, gain);
+    std::fill(amplitudes + first + reach, amplitudes + last + reach + 1, std::sqrt(gain));
+  }
+  for (int i = 0; i < width; i += 4) {
+    const Float4 gain = audio_dsp::Load4(gains + i);
+    const Float4 p = audio_dsp::Load4(power + i) * gain;
+    const Float4 clipped = audio_dsp::Sqrt4(gain * ceiling / p);  // used only where p > ceiling
+    const Float4 g = p > ceiling ? clipped : audio_dsp::Load4(amplitudes + i);
+    audio_dsp::Store4(out_re + i, audio_dsp::Load4(out_re + i) * g);
+    audio_dsp::Store4(out_im + i, audio_dsp::Load4(out_im + i) * g);
   }
 }
 
@@ -345,59 +405,72 @@ float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
   // The short track over the last kWindows windows; the long one extends
   // the short track that ended kWindows windows ago by the same windows
   // (on every other window: it is for broadcasts that take a second).
+  // Each step writes the other buffer of a pair; the short track's pair is
+  // arranged so that its last step lands in the slot's track.
   const int first = (newest + kLongWindows - kWindows + 1) % kLongWindows;
-  float* short_track = f.short_tracks[newest].data();
-  float* long_track = f.long_track.data();
+  static_assert(kWindows >= 2);
+  float* const short_track = f.short_tracks[newest].data();
+  constexpr bool kOddSteps = (kWindows - 1) % 2 == 1;
+  float* const short_rows[2] = {kOddSteps ? track_a_.data() : short_track,
+                                kOddSteps ? short_track : track_a_.data()};
+  float* const long_rows[2] = {track_b_.data(), track_c_.data()};
+  float* const older = f.short_tracks[(first + kLongWindows - 1) % kLongWindows].data();
   for (int d = 0; d < kCarrierOffsets; ++d) {
     const float* e = f.ring[first].data() + d * f.lags;
     const float scale = scales_[first];
-    std::transform(e, e + f.lags, short_track + d * f.row + kPad, [=](float p) { return p * scale; });
-    if (!update_long) continue;
-    const float* older = f.short_tracks[(first + kLongWindows - 1) % kLongWindows].data() + d * f.row;
-    std::copy(older, older + f.row, long_track + d * f.row);
-    ExtendTrack(f, long_track + d * f.row, e, scale, f.drift[d]);
+    std::transform(e, e + f.lags, short_rows[0] + d * f.row + kPad, [=](float p) { return p * scale; });
+    if (update_long) ExtendTrack(f, older + d * f.row, long_rows[1] + d * f.row, e, scale, f.drift[d]);
   }
+  // The last step's outputs give each track's best sum.
+  audio_dsp::Float4 short_top = {}, long_top = {};
   for (int k = 1; k < kWindows; ++k) {
     const int slot = (first + k) % kLongWindows;
+    const bool last = k == kWindows - 1;
     for (int d = 0; d < kCarrierOffsets; ++d) {
       const float* e = f.ring[slot].data() + d * f.lags;
-      ExtendTrack(f, short_track + d * f.row, e, scales_[slot], f.drift[d]);
-      if (update_long) ExtendTrack(f, long_track + d * f.row, e, scales_[slot], f.drift[d]);
+      const int row = d * f.row;
+      const audio_dsp::Float4 top = ExtendTrack(f, short_rows[(k - 1) % 2] + row,
+                                                short_rows[k % 2] + row, e, scales_[slot], f.drift[d]);
+      if (last) short_top = Max(short_top, top);
+      if (!update_long) continue;
+      const audio_dsp::Float4 long_step = ExtendTrack(
+          f, long_rows[k % 2] + row, long_rows[(k + 1) % 2] + row, e, scales_[slot], f.drift[d]);
+      if (last) long_top = Max(long_top, long_step);
     }
   }
   // Noise sums to f.pool per window on average; scores count from there,
   // relative to the thresholds, so a score near 0 means noise for either
   // family.
   const float mean = static_cast<float>(f.pool);
-  const auto best = [&](const float* track) {
-    audio_dsp::Float4 top = {};
-    for (int d = 0; d < kCarrierOffsets; ++d) {
-      const float* a = track + d * f.row + kPad;
-      for (int t = 0; t < f.lags; t += 4) top = Max(top, audio_dsp::Load4(a + t));
-    }
-    return std::max(std::max(top[0], top[1]), std::max(top[2], top[3]));
-  };
   if (update_long) {
-    f.long_score = (best(long_track) - kLongWindows * mean) / (f.long_threshold - kLongWindows * mean);
+    f.long_score = (audio_dsp::MaxLane4(long_top) - kLongWindows * mean) /
+                   (f.long_threshold - kLongWindows * mean);
   }
-  return std::max((best(short_track) - kWindows * mean) / (f.threshold - kWindows * mean), f.long_score);
+  return std::max(
+      (audio_dsp::MaxLane4(short_top) - kWindows * mean) / (f.threshold - kWindows * mean),
+      f.long_score);
 }
 
-void HotsoundDetector::ExtendTrack(const Family& f, float* row, const float* powers, float scale,
-                                   int drift) {
+audio_dsp::Float4 HotsoundDetector::ExtendTrack(const Family& f, float* from, float* to,
+                                                const float* powers, float scale, int drift) const {
   // Rows carry kPad copies of the other end on both sides for the cyclic
   // lags; each step may move one lag around the drift.
   const int n = f.lags;
-  std::copy(row + n, row + n + kPad, row);
-  std::copy(row + kPad, row + 2 * kPad, row + n + kPad);
-  const float* from = row + kPad - drift;
+  std::copy(from + n, from + n + kPad, from);
+  std::copy(from + kPad, from + 2 * kPad, from + n + kPad);
+  const float* source = from + kPad - drift;
+  float* out = to + kPad;
   using audio_dsp::Load4;
   const audio_dsp::Float4 gain = audio_dsp::Splat4(scale);
+  audio_dsp::Float4 top = {};
   for (int t = 0; t < n; t += 4) {
-    const audio_dsp::Float4 best = Max(Max(Load4(from + t - 1), Load4(from + t)), Load4(from + t + 1));
-    audio_dsp::Store4(pooled_.data() + t, gain * Load4(powers + t) + best);
+    const audio_dsp::Float4 best =
+        Max(Max(Load4(source + t - 1), Load4(source + t)), Load4(source + t + 1));
+    const audio_dsp::Float4 sum = gain * Load4(powers + t) + best;
+    audio_dsp::Store4(out + t, sum);
+    top = Max(top, sum);
   }
-  std::copy(pooled_.begin(), pooled_.begin() + n, row + kPad);
+  return top;
 }
 
 std::unique_ptr<HotsoundDetector> MakeHotsoundDetector(int sample_rate, int step) {

@@ -33,6 +33,7 @@
 #include <span>
 #include <vector>
 
+#include "audio/dsp/float4.h"
 #include "audio/dsp/radix4_fft.h"
 
 namespace audio_sorvane {
@@ -96,21 +97,30 @@ class HotsoundDetector {
     std::vector<int> drift;  // per carrier offset: statistics the code moves per window
     // The last kLongWindows windows' statistics, kCarrierOffsets x lags each.
     std::vector<std::vector<float>> ring;
-    // Per window slot, the short track that ended there; the long track,
-    // and its best sum relative to its threshold when last updated.
+    // Per window slot, the short track that ended there; the long track's
+    // best sum relative to its threshold when last updated.
     std::vector<std::vector<float>> short_tracks;
-    std::vector<float> long_track;
     float long_score = 0.0f;
   };
 
   void ScoreWindow();
-  // Whitens the code band of a spectrum and clips its tones.
-  void Condition(float* re, float* im) const;
+  // Mixes the window down into base_re_/base_im_; returns its power and
+  // largest sample power.
+  void MixDown(float* energy, float* peak);
+  // Whitens the code band of a spectrum (natural bin order) and clips its
+  // tones, into a centred spectrum.
+  void Condition(const float* re, const float* im, float* out_re, float* out_im) const;
+  // Sums of kSpreadLags consecutive powers every kSpreadStride lags.
+  void PoolSpread(const float* powers, float* out);
   // Adds the window in `newest` to the family's tracks; returns the higher
   // of its short and long track sums' excess over noise, each relative to
   // its threshold's (1: on the air).
   float UpdateTracks(Family& f, int newest, bool update_long);
-  void ExtendTrack(const Family& f, float* row, const float* powers, float scale, int drift);
+  // One step of a track: `to` = `from` moved by the drift and up to one
+  // lag, plus the window's scaled powers. Fills `from`'s cyclic padding.
+  // Returns the lane-wise maximum of `to`.
+  audio_dsp::Float4 ExtendTrack(const Family& f, float* from, float* to, const float* powers,
+                                float scale, int drift) const;
 
   HotsoundDetectorConfig config_;
   int step_;
@@ -121,10 +131,13 @@ class HotsoundDetector {
   // coefficients of the mixing low-pass filter.
   std::vector<int> tap_start_;
   std::vector<float> taps_re_, taps_im_;
-  // conj(code spectrum) on the window's bins, real and imaginary parts;
-  // zero outside the code band.
+  // Spectra are kept centred on the carrier: entry kMaxShift + half_band_
+  // + f holds bin f, for |f| <= half_band_ + kMaxShift (the bins the carrier
+  // offsets read). conj(code spectrum) on bins -half_band_..half_band_ from
+  // entry 0, zero-padded to product_size_ (a multiple of four).
+  int half_band_ = 0;
+  int product_size_ = 0;
   std::vector<float> code_re_, code_im_;
-  std::vector<int> code_bins_;  // bins where the code spectrum is not zero
   audio_dsp::Radix4Fft fft_;
 
   std::vector<float> window_;  // the current window's input so far
@@ -132,13 +145,17 @@ class HotsoundDetector {
   int skip_ = 0;               // input samples to drop before the next window
   // The window mixed down (and, once correlated, its lags); its spectrum and
   // the spectrum half a bin up; a spectrum times the code's.
-  std::vector<float> base_re_, base_im_, spec_re_, spec_im_, half_re_, half_im_, prod_re_, prod_im_;
+  std::vector<float> base_re_, base_im_, spec_re_, spec_im_, prod_re_, prod_im_;
+  // The two spectra conditioned and centred.
+  std::vector<float> whole_re_, whole_im_, half_re_, half_im_;
   std::vector<float> half_turn_re_, half_turn_im_;  // exp(-i pi m / kBasebandSize)
   uint32_t windows_ = 0;  // windows scored (wraps harmlessly), for the long tracks' every other window
   Family families_[2];
   std::vector<float> scales_;  // per window slot: 1 / mean power, 0 if silent
   int ring_next_ = 0;          // the slot the next window goes to
-  std::vector<float> powers_, pooled_;
+  std::vector<float> pooled_;  // PoolSpread's partial sums
+  // Track rows being built (kCarrierOffsets rows of the widest family).
+  std::vector<float> track_a_, track_b_, track_c_;
   float score_ = 0.0f;
 };
 

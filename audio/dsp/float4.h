@@ -5,7 +5,14 @@
 #ifndef AUDIO_DSP_FLOAT4_H_
 #define AUDIO_DSP_FLOAT4_H_
 
+#include <cmath>
 #include <cstring>
+
+#if defined(__SSE__)
+#include <xmmintrin.h>
+#elif defined(__ARM_NEON) && defined(__aarch64__)
+#include <arm_neon.h>
+#endif
 
 namespace audio_dsp {
 
@@ -34,6 +41,17 @@ inline void Transpose4(Float4& a, Float4& b, Float4& c, Float4& d) {
   b = __builtin_shufflevector(t0, t1, 2, 3, 6, 7);
   c = __builtin_shufflevector(t2, t3, 0, 1, 4, 5);
   d = __builtin_shufflevector(t2, t3, 2, 3, 6, 7);
+}
+
+// Lane-wise square root (one instruction on SSE and AArch64 NEON).
+inline Float4 Sqrt4(Float4 v) {
+#if defined(__SSE__)
+  return reinterpret_cast<Float4>(_mm_sqrt_ps(reinterpret_cast<__m128>(v)));
+#elif defined(__ARM_NEON) && defined(__aarch64__)
+  return reinterpret_cast<Float4>(vsqrtq_f32(reinterpret_cast<float32x4_t>(v)));
+#else
+  return Float4{std::sqrt(v[0]), std::sqrt(v[1]), std::sqrt(v[2]), std::sqrt(v[3])};
+#endif
 }
 
 // Lane-wise maximum (exact; for ordered values the same as std::max).
