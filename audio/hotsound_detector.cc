@@ -385,11 +385,11 @@ void HotsoundDetector::Condition(const float* spec_re, const float* spec_im, flo
   for (int lo = -half_band; lo < half_band; lo += kWhiteningBlock) {
     const int first = lo == -half_band ? -reach : lo;
     const int last = lo + kWhiteningBlock >= half_band ? reach : lo + kWhiteningBlock - 1;
-    const float block = Sum(power + first + reach, last - first + 1);
+    const float block = Sum(power + (first + reach), last - first + 1);
     // A block without power stays as it is (zero).
     const float gain = block > 0.0f ? band_mean * static_cast<float>(last - first + 1) / block : 1.0f;
-    std::fill(gains + first + reach, gains + last + reach + 1, gain);
-    std::fill(amplitudes + first + reach, amplitudes + last + reach + 1, std::sqrt(gain));
+    std::fill(gains + (first + reach), gains + (last + reach + 1), gain);
+    std::fill(amplitudes + (first + reach), amplitudes + (last + reach + 1), std::sqrt(gain));
   }
   for (int i = 0; i < width; i += 4) {
     const Float4 gain = audio_dsp::Load4(gains + i);
