@@ -177,6 +177,27 @@ TEST(HotsoundDetectorTest, BlockSizeDoesNotMatter) {
   }
 }
 
+// The eight-lane track steps (where the processor has them) score as the
+// four-lane ones do, up to the rounding of fused multiply-adds.
+TEST(HotsoundDetectorTest, WideAndNarrowStepsAgree) {
+  auto wide = MakeHotsoundDetector(44100, 1);
+  if (!wide->UseWideSteps(true)) GTEST_SKIP() << "no eight-lane steps on this processor";
+  auto narrow = MakeHotsoundDetector(44100, 1);
+  ASSERT_TRUE(narrow->UseWideSteps(false));
+  const std::vector<int16_t> audio =
+      ToPcm(Broadcast(1.5, -10.0, sorvel_sim::NoiseKind::kPink, 1.0, 1.0));
+  std::vector<int16_t> a, b;
+  float top = 0.0f;  // the comparison must cover a broadcast's scores
+  for (size_t start = 0; start < audio.size(); start += 1000) {
+    a.assign(audio.begin() + start, audio.begin() + std::min(audio.size(), start + 1000));
+    b = a;
+    const float expected = narrow->Process(b);
+    EXPECT_NEAR(wide->Process(a), expected, 1e-5f * std::max(1.0f, expected)) << start;
+    top = std::max(top, expected);
+  }
+  EXPECT_TRUE(narrow->Detected(top));
+}
+
 TEST(HotsoundDetectorTest, StepAveragesPairs) {
   auto detector = MakeHotsoundDetector(44100, 2);
   std::vector<int16_t> block = {10, 20, -3, -4, 7, 8, 100, -101};

@@ -6,6 +6,7 @@
 #include <numbers>
 
 #include "audio/dsp/float4.h"
+#include "audio/dsp/multiversion.h"
 #include "audio/sorvane/symbol_wave_coder.h"
 #include "base/logging.h"
 
@@ -75,6 +76,117 @@ double Blackman(double x) {  // x in [-1, 1]
   return 0.42 + 0.5 * std::cos(std::numbers::pi * x) + 0.08 * std::cos(2 * std::numbers::pi * x);
 }
 
+// Eight floats per value for MixWindow's multiply-adds: one AVX register in
+// its AVX2 clones (a pair of SSE registers in the baseline one) on x86, a
+// pair of Float4 elsewhere (a 32-byte vector type there goes through the
+// stack).
+#if defined(SORVEL_WIDE_PATHS)
+typedef float Taps8 __attribute__((vector_size(32)));
+#define LOAD_TAPS8(p) SORVEL_LOAD_WIDE(p)
+#define FOLD_TAPS8(v) \
+  (__builtin_shufflevector((v), (v), 0, 1, 2, 3) + __builtin_shufflevector((v), (v), 4, 5, 6, 7))
+#else
+using Taps8 = audio_dsp::Float8;
+#define LOAD_TAPS8(p) audio_dsp::Load8(p)
+#define FOLD_TAPS8(v) ((v).lo + (v).hi)
+#endif
+
+// Mixes a window down: each of kN baseband samples is the dot product of
+// `taps` input samples from tap_start[m] with its complex taps (rows of
+// taps_re and taps_im). Returns the baseband's power and largest sample
+// power.
+SORVEL_MULTIVERSION void MixWindow(const float* window, const int* tap_start,
+                                   const float* taps_re, const float* taps_im, int taps,
+                                   float* base_re, float* base_im, float* energy, float* peak) {
+  // Four baseband samples at a time, their tap sums reduced together.
+  using audio_dsp::Float4;
+  using audio_dsp::Load4;
+  Float4 total = {}, top = {};
+  for (int m = 0; m < kN; m += 4) {
+    Float4 re[4], im[4];
+    for (int j = 0; j < 4; ++j) {
+      const float* x = window + tap_start[m + j];
+      const float* tr = taps_re + static_cast<size_t>(m + j) * taps;
+      const float* ti = taps_im + static_cast<size_t>(m + j) * taps;
+      Taps8 r = {}, i = {};
+      for (int t = 0; t < taps; t += 8) {
+        const Taps8 xv = LOAD_TAPS8(x + t);
+        r += xv * LOAD_TAPS8(tr + t);
+        i += xv * LOAD_TAPS8(ti + t);
+      }
+      re[j] = FOLD_TAPS8(r);
+      im[j] = FOLD_TAPS8(i);
+    }
+    audio_dsp::Transpose4(re[0], re[1], re[2], re[3]);
+    audio_dsp::Transpose4(im[0], im[1], im[2], im[3]);
+    const Float4 sr = (re[0] + re[1]) + (re[2] + re[3]);
+    const Float4 si = (im[0] + im[1]) + (im[2] + im[3]);
+    audio_dsp::Store4(base_re + m, sr);
+    audio_dsp::Store4(base_im + m, si);
+    const Float4 power = sr * sr + si * si;
+    total += power;
+    top = audio_dsp::Max4(top, power);
+  }
+  *energy = audio_dsp::Sum4(total);
+  *peak = audio_dsp::MaxLane4(top);
+}
+
+// Fills a track row's cyclic padding: kPad copies of the other end of its
+// n lags on both sides.
+void PadRow(int n, float* row) {
+  std::copy(row + n, row + n + kPad, row);
+  std::copy(row + kPad, row + 2 * kPad, row + n + kPad);
+}
+
+// One track step over n lags (see HotsoundDetector::ExtendTrack).
+audio_dsp::Float4 StepTrack(int n, float* from, float* to, const float* powers,
+                            float scale, int drift) {
+  // Each step may move one lag around the drift.
+  PadRow(n, from);
+  const float* source = from + kPad - drift;
+  float* out = to + kPad;
+  using audio_dsp::Load4;
+  const audio_dsp::Float4 gain = audio_dsp::Splat4(scale);
+  audio_dsp::Float4 top = {};
+  for (int t = 0; t < n; t += 4) {
+    const audio_dsp::Float4 best =
+        Max(Max(Load4(source + t - 1), Load4(source + t)), Load4(source + t + 1));
+    const audio_dsp::Float4 sum = gain * Load4(powers + t) + best;
+    audio_dsp::Store4(out + t, sum);
+    top = Max(top, sum);
+  }
+  return top;
+}
+
+
+#if defined(SORVEL_WIDE_PATHS)
+// StepTrack eight lags at a time.
+SORVEL_WIDE audio_dsp::Float4 StepTrackWide(int n, float* from, float* to, const float* powers,
+                                            float scale, int drift) {
+  using audio_dsp::Wide;
+  PadRow(n, from);
+  const float* source = from + kPad - drift;
+  float* out = to + kPad;
+  const Wide gain = Wide{} + scale;
+  Wide top = {};
+  for (int t = 0; t < n; t += 8) {
+    const Wide a = SORVEL_LOAD_WIDE(source + t - 1), b = SORVEL_LOAD_WIDE(source + t);
+    const Wide c = SORVEL_LOAD_WIDE(source + t + 1);
+    const Wide ab = a > b ? a : b;
+    const Wide best = ab > c ? ab : c;
+    const Wide sum = gain * SORVEL_LOAD_WIDE(powers + t) + best;
+    SORVEL_STORE_WIDE(out + t, sum);
+    top = top > sum ? top : sum;
+  }
+  return Max(__builtin_shufflevector(top, top, 0, 1, 2, 3), __builtin_shufflevector(top, top, 4, 5, 6, 7));
+}
+#else
+audio_dsp::Float4 StepTrackWide(int n, float* from, float* to, const float* powers, float scale,
+                                int drift) {
+  return StepTrack(n, from, to, powers, scale, drift);
+}
+#endif
+
 }  // namespace
 
 bool HotsoundDetector::RateFits(double sample_rate, double frequency) {
@@ -89,7 +201,7 @@ std::unique_ptr<HotsoundDetector> HotsoundDetector::Create(const HotsoundDetecto
 }
 
 HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int step)
-    : config_(config), step_(std::max(step, 1)), fft_(kN) {
+    : config_(config), step_(std::max(step, 1)), fft_(kN), wide_steps_(audio_dsp::HasWidePaths()) {
   // The broadcast's frame: the default code, chip rate and frame length.
   const SymbolWaveCoderParams coder;
   const int chips = static_cast<int>(coder.code.size());
@@ -224,39 +336,8 @@ float HotsoundDetector::Process(std::span<int16_t> samples) {
 }
 
 void HotsoundDetector::MixDown(float* energy, float* peak) {
-  // Four baseband samples at a time, their tap sums reduced together.
-  using audio_dsp::Float4;
-  using audio_dsp::Load4;
-  Float4 total = {}, top = {};
-  for (int m = 0; m < kN; m += 4) {
-    Float4 re[4], im[4];
-    for (int j = 0; j < 4; ++j) {
-      const float* x = window_.data() + tap_start_[m + j];
-      const float* tr = taps_re_.data() + static_cast<size_t>(m + j) * taps_;
-      const float* ti = taps_im_.data() + static_cast<size_t>(m + j) * taps_;
-      Float4 r0 = {}, r1 = {}, i0 = {}, i1 = {};
-      for (int t = 0; t < taps_; t += 8) {
-        const Float4 x0 = Load4(x + t), x1 = Load4(x + t + 4);
-        r0 += x0 * Load4(tr + t);
-        r1 += x1 * Load4(tr + t + 4);
-        i0 += x0 * Load4(ti + t);
-        i1 += x1 * Load4(ti + t + 4);
-      }
-      re[j] = r0 + r1;
-      im[j] = i0 + i1;
-    }
-    audio_dsp::Transpose4(re[0], re[1], re[2], re[3]);
-    audio_dsp::Transpose4(im[0], im[1], im[2], im[3]);
-    const Float4 sr = (re[0] + re[1]) + (re[2] + re[3]);
-    const Float4 si = (im[0] + im[1]) + (im[2] + im[3]);
-    audio_dsp::Store4(&base_re_[m], sr);
-    audio_dsp::Store4(&base_im_[m], si);
-    const Float4 power = sr * sr + si * si;
-    total += power;
-    top = audio_dsp::Max4(top, power);
-  }
-  *energy = audio_dsp::Sum4(total);
-  *peak = audio_dsp::MaxLane4(top);
+  MixWindow(window_.data(), tap_start_.data(), taps_re_.data(), taps_im_.data(), taps_,
+            base_re_.data(), base_im_.data(), energy, peak);
 }
 
 void HotsoundDetector::ScoreWindow() {
@@ -453,24 +534,14 @@ float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
 
 audio_dsp::Float4 HotsoundDetector::ExtendTrack(const Family& f, float* from, float* to,
                                                 const float* powers, float scale, int drift) const {
-  // Rows carry kPad copies of the other end on both sides for the cyclic
-  // lags; each step may move one lag around the drift.
-  const int n = f.lags;
-  std::copy(from + n, from + n + kPad, from);
-  std::copy(from + kPad, from + 2 * kPad, from + n + kPad);
-  const float* source = from + kPad - drift;
-  float* out = to + kPad;
-  using audio_dsp::Load4;
-  const audio_dsp::Float4 gain = audio_dsp::Splat4(scale);
-  audio_dsp::Float4 top = {};
-  for (int t = 0; t < n; t += 4) {
-    const audio_dsp::Float4 best =
-        Max(Max(Load4(source + t - 1), Load4(source + t)), Load4(source + t + 1));
-    const audio_dsp::Float4 sum = gain * Load4(powers + t) + best;
-    audio_dsp::Store4(out + t, sum);
-    top = Max(top, sum);
-  }
-  return top;
+  return wide_steps_ ? StepTrackWide(f.lags, from, to, powers, scale, drift)
+                     : StepTrack(f.lags, from, to, powers, scale, drift);
+}
+
+bool HotsoundDetector::UseWideSteps(bool wide) {
+  if (wide && !audio_dsp::HasWidePaths()) return false;
+  wide_steps_ = wide;
+  return true;
 }
 
 std::unique_ptr<HotsoundDetector> MakeHotsoundDetector(int sample_rate, int step) {

@@ -81,6 +81,11 @@ class HotsoundDetector {
   float Process(std::span<int16_t> samples);
   bool Detected(float score) const { return score > kThreshold; }
 
+  // Picks the track steps of eight lags (x86 with AVX2 and FMA) or of four;
+  // by default the widest the processor runs. Scores agree to rounding.
+  // Returns false, changing nothing, if the processor lacks the wide one.
+  bool UseWideSteps(bool wide);
+
   int step() const { return step_; }
   float score() const { return score_; }
 
@@ -139,6 +144,7 @@ class HotsoundDetector {
   int product_size_ = 0;
   std::vector<float> code_re_, code_im_;
   audio_dsp::Radix4Fft fft_;
+  bool wide_steps_;
 
   std::vector<float> window_;  // the current window's input so far
   int fill_ = 0;

@@ -4,6 +4,7 @@
 #include <numbers>
 
 #include "audio/dsp/float4.h"
+#include "audio/dsp/multiversion.h"
 #include "base/logging.h"
 
 namespace audio_dsp {
@@ -25,18 +26,168 @@ Complex4 Multiply(Complex4 a, const float* w) {
   return {a.re * wr - a.im * wi, a.re * wi + a.im * wr};
 }
 
-// The four-point DFT of a0..a3 (exponent -2 pi i), in place.
-void Butterfly(Complex4& a0, Complex4& a1, Complex4& a2, Complex4& a3) {
-  const Complex4 t0{a0.re + a2.re, a0.im + a2.im};
-  const Complex4 t1{a0.re - a2.re, a0.im - a2.im};
-  const Complex4 t2{a1.re + a3.re, a1.im + a3.im};
+// The four-point DFT of a0..a3 (exponent -2 pi i), in place, lane-wise.
+template <typename Complex>
+inline __attribute__((always_inline)) void Butterfly(Complex& a0, Complex& a1, Complex& a2, Complex& a3) {
+  const Complex t0{a0.re + a2.re, a0.im + a2.im};
+  const Complex t1{a0.re - a2.re, a0.im - a2.im};
+  const Complex t2{a1.re + a3.re, a1.im + a3.im};
   // -i (a1 - a3)
-  const Complex4 t3{a1.im - a3.im, a3.re - a1.re};
+  const Complex t3{a1.im - a3.im, a3.re - a1.re};
   a0 = {t0.re + t2.re, t0.im + t2.im};
   a2 = {t0.re - t2.re, t0.im - t2.im};
   a1 = {t1.re + t3.re, t1.im + t3.im};
   a3 = {t1.re - t3.re, t1.im - t3.im};
 }
+
+// The transform of `size` values through the scratch pairs a and b, with
+// the stages' twiddles `w`.
+SORVEL_MULTIVERSION void Transform(int size, const float* w, const float* re, const float* im,
+                                   float* out_re, float* out_im, float* a_re, float* a_im,
+                                   float* b_re, float* b_im) {
+  const int quarter = size / 4;
+  // First stage: length-4 transforms of x[j + r quarter], written to
+  // 4 j + r (a transpose of each group of four butterflies).
+  float* dst_re = a_re;
+  float* dst_im = a_im;
+  for (int j = 0; j < quarter; j += 4) {
+    Complex4 a0 = Load(re, im, j), a1 = Load(re, im, j + quarter);
+    Complex4 a2 = Load(re, im, j + 2 * quarter), a3 = Load(re, im, j + 3 * quarter);
+    Butterfly(a0, a1, a2, a3);
+    Transpose4(a0.re, a1.re, a2.re, a3.re);
+    Transpose4(a0.im, a1.im, a2.im, a3.im);
+    Store(dst_re, dst_im, 4 * j, a0);
+    Store(dst_re, dst_im, 4 * j + 4, a1);
+    Store(dst_re, dst_im, 4 * j + 8, a2);
+    Store(dst_re, dst_im, 4 * j + 12, a3);
+  }
+  const float* src_re = dst_re;
+  const float* src_im = dst_im;
+  for (int ns = 4; ns < size; ns *= 4) {
+    if (ns * 4 == size) {
+      dst_re = out_re;
+      dst_im = out_im;
+    } else {
+      dst_re = src_re == a_re ? b_re : a_re;
+      dst_im = src_im == a_im ? b_im : a_im;
+    }
+    for (int j = 0; j < quarter; j += 4, w += 24) {
+      Complex4 a0 = Load(src_re, src_im, j);
+      Complex4 a1 = Multiply(Load(src_re, src_im, j + quarter), w);
+      Complex4 a2 = Multiply(Load(src_re, src_im, j + 2 * quarter), w + 8);
+      Complex4 a3 = Multiply(Load(src_re, src_im, j + 3 * quarter), w + 16);
+      Butterfly(a0, a1, a2, a3);
+      const int k = j % ns;
+      const int base = (j - k) * 4 + k;
+      Store(dst_re, dst_im, base, a0);
+      Store(dst_re, dst_im, base + ns, a1);
+      Store(dst_re, dst_im, base + 2 * ns, a2);
+      Store(dst_re, dst_im, base + 3 * ns, a3);
+    }
+    src_re = dst_re;
+    src_im = dst_im;
+  }
+}
+
+#if defined(SORVEL_WIDE_PATHS)
+struct ComplexWide {
+  Wide re, im;
+};
+
+#define SORVEL_LOAD_COMPLEX(re, im, at) \
+  ComplexWide { SORVEL_LOAD_WIDE((re) + (at)), SORVEL_LOAD_WIDE((im) + (at)) }
+
+// a *= the twiddles at tw (eight real parts, then eight imaginary).
+SORVEL_WIDE inline void MultiplyWide(ComplexWide& a, const float* tw) {
+  const Wide wr = SORVEL_LOAD_WIDE(tw), wi = SORVEL_LOAD_WIDE(tw + 8);
+  const Wide r = a.re * wr - a.im * wi;
+  a.im = a.re * wi + a.im * wr;
+  a.re = r;
+}
+
+// Transposes the 4 x 4 matrices in the low and in the high halves of the
+// rows v0..v3.
+SORVEL_WIDE inline void TransposeHalves(Wide& v0, Wide& v1, Wide& v2, Wide& v3) {
+  const Wide t0 = __builtin_shufflevector(v0, v1, 0, 8, 1, 9, 4, 12, 5, 13);
+  const Wide t1 = __builtin_shufflevector(v2, v3, 0, 8, 1, 9, 4, 12, 5, 13);
+  const Wide t2 = __builtin_shufflevector(v0, v1, 2, 10, 3, 11, 6, 14, 7, 15);
+  const Wide t3 = __builtin_shufflevector(v2, v3, 2, 10, 3, 11, 6, 14, 7, 15);
+  v0 = __builtin_shufflevector(t0, t1, 0, 1, 8, 9, 4, 5, 12, 13);
+  v1 = __builtin_shufflevector(t0, t1, 2, 3, 10, 11, 6, 7, 14, 15);
+  v2 = __builtin_shufflevector(t2, t3, 0, 1, 8, 9, 4, 5, 12, 13);
+  v3 = __builtin_shufflevector(t2, t3, 2, 3, 10, 11, 6, 7, 14, 15);
+}
+
+// Stores the low halves of v0..v3 at dst + at, +4, +8, +12 and the high
+// halves at +16 .. +28.
+SORVEL_WIDE inline void StoreHalves(float* dst, int at, const Wide& v0, const Wide& v1,
+                                    const Wide& v2, const Wide& v3) {
+  SORVEL_STORE_WIDE(dst + at, __builtin_shufflevector(v0, v1, 0, 1, 2, 3, 8, 9, 10, 11));
+  SORVEL_STORE_WIDE(dst + at + 8, __builtin_shufflevector(v2, v3, 0, 1, 2, 3, 8, 9, 10, 11));
+  SORVEL_STORE_WIDE(dst + at + 16, __builtin_shufflevector(v0, v1, 4, 5, 6, 7, 12, 13, 14, 15));
+  SORVEL_STORE_WIDE(dst + at + 24, __builtin_shufflevector(v2, v3, 4, 5, 6, 7, 12, 13, 14, 15));
+}
+
+// Transform with eight butterflies at a time, for sizes of at least 64.
+// Twiddles `w` per stage after the first and group of eight butterflies:
+// w^1, w^2, w^3, real and imaginary, eight lanes each. Where a group's
+// outputs are not eight in a row (the first two stages), each 128-bit half
+// holds four of them.
+SORVEL_WIDE void TransformWide(int size, const float* w, const float* re, const float* im,
+                               float* out_re, float* out_im, float* a_re, float* a_im,
+                               float* b_re, float* b_im) {
+  const int quarter = size / 4;
+  float* dst_re = a_re;
+  float* dst_im = a_im;
+  for (int j = 0; j < quarter; j += 8) {
+    ComplexWide a0 = SORVEL_LOAD_COMPLEX(re, im, j), a1 = SORVEL_LOAD_COMPLEX(re, im, j + quarter);
+    ComplexWide a2 = SORVEL_LOAD_COMPLEX(re, im, j + 2 * quarter);
+    ComplexWide a3 = SORVEL_LOAD_COMPLEX(re, im, j + 3 * quarter);
+    Butterfly(a0, a1, a2, a3);
+    // Lane l's four outputs go to 4 (j + l) .. 4 (j + l) + 3.
+    TransposeHalves(a0.re, a1.re, a2.re, a3.re);
+    TransposeHalves(a0.im, a1.im, a2.im, a3.im);
+    StoreHalves(dst_re, 4 * j, a0.re, a1.re, a2.re, a3.re);
+    StoreHalves(dst_im, 4 * j, a0.im, a1.im, a2.im, a3.im);
+  }
+  const float* src_re = dst_re;
+  const float* src_im = dst_im;
+  for (int ns = 4; ns < size; ns *= 4) {
+    if (ns * 4 == size) {
+      dst_re = out_re;
+      dst_im = out_im;
+    } else {
+      dst_re = src_re == a_re ? b_re : a_re;
+      dst_im = src_im == a_im ? b_im : a_im;
+    }
+    for (int j = 0; j < quarter; j += 8, w += 48) {
+      ComplexWide a0 = SORVEL_LOAD_COMPLEX(src_re, src_im, j);
+      ComplexWide a1 = SORVEL_LOAD_COMPLEX(src_re, src_im, j + quarter);
+      ComplexWide a2 = SORVEL_LOAD_COMPLEX(src_re, src_im, j + 2 * quarter);
+      ComplexWide a3 = SORVEL_LOAD_COMPLEX(src_re, src_im, j + 3 * quarter);
+      MultiplyWide(a1, w);
+      MultiplyWide(a2, w + 16);
+      MultiplyWide(a3, w + 32);
+      Butterfly(a0, a1, a2, a3);
+      if (ns == 4) {  // lanes 0-3 go to 4 j + r ns + l, lanes 4-7 16 further
+        StoreHalves(dst_re, 4 * j, a0.re, a1.re, a2.re, a3.re);
+        StoreHalves(dst_im, 4 * j, a0.im, a1.im, a2.im, a3.im);
+        continue;
+      }
+      const int k = j % ns;
+      const int base = (j - k) * 4 + k;
+      for (int r = 0; r < 4; ++r) {
+        const ComplexWide& a = r == 0 ? a0 : r == 1 ? a1 : r == 2 ? a2 : a3;
+        SORVEL_STORE_WIDE(dst_re + base + r * ns, a.re);
+        SORVEL_STORE_WIDE(dst_im + base + r * ns, a.im);
+      }
+    }
+    src_re = dst_re;
+    src_im = dst_im;
+  }
+}
+#undef SORVEL_LOAD_COMPLEX
+#endif
 
 }  // namespace
 
@@ -62,56 +213,45 @@ Radix4Fft::Radix4Fft(int size) : size_(size) {
       }
     }
   }
+  // The same per group of eight butterflies, for the eight-lane path.
+  for (int ns = 4; ns < size && size >= 64; ns *= 4) {
+    for (int j = 0; j < size / 4; j += 8) {
+      for (int r = 1; r <= 3; ++r) {
+        float re[8], im[8];
+        for (int lane = 0; lane < 8; ++lane) {
+          const int k = (j + lane) % ns;
+          const double angle = -2.0 * std::numbers::pi * r * k / (4.0 * ns);
+          re[lane] = static_cast<float>(std::cos(angle));
+          im[lane] = static_cast<float>(std::sin(angle));
+        }
+        wide_twiddles_.insert(wide_twiddles_.end(), re, re + 8);
+        wide_twiddles_.insert(wide_twiddles_.end(), im, im + 8);
+      }
+    }
+  }
+  wide_ = !wide_twiddles_.empty() && HasWidePaths();
   a_re_.resize(size);
   a_im_.resize(size);
   b_re_.resize(size);
   b_im_.resize(size);
 }
 
+bool Radix4Fft::UseWide(bool wide) {
+  if (wide && (wide_twiddles_.empty() || !HasWidePaths())) return false;
+  wide_ = wide;
+  return true;
+}
+
 void Radix4Fft::Forward(const float* re, const float* im, float* out_re, float* out_im) {
-  const int quarter = size_ / 4;
-  // First stage: length-4 transforms of x[j + r quarter], written to
-  // 4 j + r (a transpose of each group of four butterflies).
-  float* dst_re = a_re_.data();
-  float* dst_im = a_im_.data();
-  for (int j = 0; j < quarter; j += 4) {
-    Complex4 a0 = Load(re, im, j), a1 = Load(re, im, j + quarter);
-    Complex4 a2 = Load(re, im, j + 2 * quarter), a3 = Load(re, im, j + 3 * quarter);
-    Butterfly(a0, a1, a2, a3);
-    Transpose4(a0.re, a1.re, a2.re, a3.re);
-    Transpose4(a0.im, a1.im, a2.im, a3.im);
-    Store(dst_re, dst_im, 4 * j, a0);
-    Store(dst_re, dst_im, 4 * j + 4, a1);
-    Store(dst_re, dst_im, 4 * j + 8, a2);
-    Store(dst_re, dst_im, 4 * j + 12, a3);
+#if defined(SORVEL_WIDE_PATHS)
+  if (wide_) {
+    TransformWide(size_, wide_twiddles_.data(), re, im, out_re, out_im, a_re_.data(),
+                  a_im_.data(), b_re_.data(), b_im_.data());
+    return;
   }
-  const float* src_re = dst_re;
-  const float* src_im = dst_im;
-  const float* w = twiddles_.data();
-  for (int ns = 4; ns < size_; ns *= 4) {
-    if (ns * 4 == size_) {
-      dst_re = out_re;
-      dst_im = out_im;
-    } else {
-      dst_re = src_re == a_re_.data() ? b_re_.data() : a_re_.data();
-      dst_im = src_im == a_im_.data() ? b_im_.data() : a_im_.data();
-    }
-    for (int j = 0; j < quarter; j += 4, w += 24) {
-      Complex4 a0 = Load(src_re, src_im, j);
-      Complex4 a1 = Multiply(Load(src_re, src_im, j + quarter), w);
-      Complex4 a2 = Multiply(Load(src_re, src_im, j + 2 * quarter), w + 8);
-      Complex4 a3 = Multiply(Load(src_re, src_im, j + 3 * quarter), w + 16);
-      Butterfly(a0, a1, a2, a3);
-      const int k = j % ns;
-      const int base = (j - k) * 4 + k;
-      Store(dst_re, dst_im, base, a0);
-      Store(dst_re, dst_im, base + ns, a1);
-      Store(dst_re, dst_im, base + 2 * ns, a2);
-      Store(dst_re, dst_im, base + 3 * ns, a3);
-    }
-    src_re = dst_re;
-    src_im = dst_im;
-  }
+#endif
+  Transform(size_, twiddles_.data(), re, im, out_re, out_im, a_re_.data(), a_im_.data(),
+            b_re_.data(), b_im_.data());
 }
 
 }  // namespace audio_dsp

@@ -21,6 +21,10 @@ class Radix4Fft {
   explicit Radix4Fft(int size);
 
   int size() const { return size_; }
+  // Picks eight butterflies at a time (x86 with AVX2 and FMA, sizes from
+  // 64) or four; by default the widest available. Outputs agree to
+  // rounding. Returns false, changing nothing, if the wide path is missing.
+  bool UseWide(bool wide);
   // `size` values in from (re, im), out to (out_re, out_im); the outputs may
   // be the inputs.
   void Forward(const float* re, const float* im, float* out_re, float* out_im);
@@ -35,6 +39,8 @@ class Radix4Fft {
   // Per stage after the first, per group of four butterflies: the twiddles
   // w^1, w^2, w^3, real and imaginary, four lanes each.
   std::vector<float> twiddles_;
+  std::vector<float> wide_twiddles_;  // the same per group of eight
+  bool wide_ = false;
   std::vector<float> a_re_, a_im_, b_re_, b_im_;
 };
 

@@ -7,6 +7,7 @@
 #include <numbers>
 
 #include "audio/dsp/float4.h"
+#include "audio/dsp/multiversion.h"
 #include "audio/sorvane/sorvane_util.h"
 #include "base/logging.h"
 
@@ -35,13 +36,6 @@ using audio_dsp::Float8;
 #define SORVEL_SPLAT8(x) audio_dsp::Splat8(x)
 #endif
 #define SORVEL_SUM8(v) (((v)[0] + (v)[1]) + ((v)[2] + (v)[3]) + (((v)[4] + (v)[5]) + ((v)[6] + (v)[7])))
-
-#if defined(__x86_64__) && defined(__ELF__)
-#define SORVEL_MULTIVERSION \
-  __attribute__((target_clones("arch=x86-64-v3", "avx2", "default")))
-#else
-#define SORVEL_MULTIVERSION
-#endif
 
 // re/im correlation of each chunk of `code` with the frame.
 SORVEL_MULTIVERSION void CorrelateChunks(const float* code, const float* frame_real,
