@@ -131,6 +131,33 @@ SORVEL_MULTIVERSION void MixWindow(const float* window, const int* tap_start,
   *peak = audio_dsp::MaxLane4(top);
 }
 
+// prod = x * code over n bins (a multiple of four); returns the products'
+// total power.
+SORVEL_MULTIVERSION float MultiplySpectra(const float* x_re, const float* x_im,
+                                          const float* code_re, const float* code_im, int n,
+                                          float* prod_re, float* prod_im) {
+  using audio_dsp::Float4;
+  using audio_dsp::Load4;
+  Float4 total = {};
+  for (int i = 0; i < n; i += 4) {
+    const Float4 a = Load4(x_re + i), b = Load4(x_im + i);
+    const Float4 c = Load4(code_re + i), e = Load4(code_im + i);
+    const Float4 re = a * c - b * e, im = a * e + b * c;
+    audio_dsp::Store4(prod_re + i, re);
+    audio_dsp::Store4(prod_im + i, im);
+    total += re * re + im * im;
+  }
+  return audio_dsp::Sum4(total);
+}
+
+// out = |re + i im|^2 over n values (a multiple of four).
+SORVEL_MULTIVERSION void Powers(const float* re, const float* im, int n, float* out) {
+  for (int t = 0; t < n; t += 4) {
+    const audio_dsp::Float4 r = audio_dsp::Load4(re + t), i = audio_dsp::Load4(im + t);
+    audio_dsp::Store4(out + t, r * r + i * i);
+  }
+}
+
 // Fills a track row's cyclic padding: kPad copies of the other end of its
 // n lags on both sides.
 void PadRow(int n, float* row) {
@@ -365,31 +392,20 @@ void HotsoundDetector::ScoreWindow() {
     // inverse transform is unnormalised: sum |c|^2 = kN sum |product|^2).
     // The products sit from bin 0 rather than around it: a cyclic shift of
     // the spectrum turns the lags' phases but not their powers.
-    using audio_dsp::Float4;
-    using audio_dsp::Load4;
-    Float4 total = {};
+    float total = 0.0f;
     for (int d = 0; d < kCarrierOffsets; ++d) {
       const int shift = static_cast<int>(std::floor(kOffsetBins[d]));
       const bool half = kOffsetBins[d] != shift;
       const float* x_re = (half ? half_re_.data() : whole_re_.data()) + kMaxShift + shift;
       const float* x_im = (half ? half_im_.data() : whole_im_.data()) + kMaxShift + shift;
-      for (int i = 0; i < product_size_; i += 4) {
-        const Float4 a = Load4(x_re + i), b = Load4(x_im + i);
-        const Float4 c = Load4(&code_re_[i]), e = Load4(&code_im_[i]);
-        const Float4 re = a * c - b * e, im = a * e + b * c;
-        audio_dsp::Store4(&prod_re_[i], re);
-        audio_dsp::Store4(&prod_im_[i], im);
-        total += re * re + im * im;
-      }
+      total += MultiplySpectra(x_re, x_im, code_re_.data(), code_im_.data(), product_size_,
+                               prod_re_.data(), prod_im_.data());
       fft_.Inverse(prod_re_.data(), prod_im_.data(), base_re_.data(), base_im_.data());
       float* powers = families_[0].ring[slot].data() + d * kN;
-      for (int t = 0; t < kN; t += 4) {
-        const Float4 re = Load4(&base_re_[t]), im = Load4(&base_im_[t]);
-        audio_dsp::Store4(powers + t, re * re + im * im);
-      }
+      Powers(base_re_.data(), base_im_.data(), kN, powers);
       PoolSpread(powers, families_[1].ring[slot].data() + d * families_[1].lags);
     }
-    scale = kCarrierOffsets / audio_dsp::Sum4(total);
+    scale = kCarrierOffsets / total;
   }
   scales_[slot] = scale;
 
