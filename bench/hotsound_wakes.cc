@@ -213,16 +213,18 @@ int Duty(double minutes) {
 // points, each after a second of the channel's noise) through `channel`
 // (its seed varied per broadcast): the share woken within 0.5 s of the
 // broadcast's start, the median latency and the median peak score in that
-// half second.
+// half second, and how many of the broadcasts that a plain DSSS decoder fed
+// the same audio decodes were also woken in time.
 struct WakeStats {
   int woken_percent;
   double median_latency, median_peak;
+  int dsss_decoded, woken_of_decoded;
 };
 
 WakeStats MeasureWakes(audio_sorvane::AudioModemEncoder& encoder, sorvel_sim::ChannelConfig channel,
                        int seeds) {
   std::vector<double> latency, peak;
-  int woken = 0;
+  int woken = 0, dsss_decoded = 0, woken_of_decoded = 0;
   for (int s = 0; s < seeds; ++s) {
     std::mt19937_64 rng(77 + s);
     std::vector<uint8_t> message(6);
@@ -231,7 +233,7 @@ WakeStats MeasureWakes(audio_sorvane::AudioModemEncoder& encoder, sorvel_sim::Ch
     encoder.Encode(message, &token, 2);
     std::vector<float> loop = sorvel_sim::RenderLoopedBroadcast(encoder, token, 3.0);
     loop.erase(loop.begin(), loop.begin() + std::uniform_int_distribution<size_t>(0, token.size())(rng));
-    loop.resize(static_cast<size_t>(1.0 * kRate));
+    loop.resize(static_cast<size_t>(2.5 * kRate));  // room for a whole token after any start
     channel.leading_silence = 1.0;
     channel.seed = 500ULL + s;
     std::vector<int16_t> pcm = ToPcm(sorvel_sim::ApplyChannel(loop, channel));
@@ -246,23 +248,32 @@ WakeStats MeasureWakes(audio_sorvane::AudioModemEncoder& encoder, sorvel_sim::Ch
       if (detector->Detected(score) && !std::isfinite(t)) t = (start + n - double(begin)) / kRate;
     }
     woken += t <= 0.5;
+    const auto dsss = audio_sorvane::MakeDsssDecoder({});
+    audio_sorvane::AudioModemDecoder::DecodeResults results;
+    bool decoded = false;
+    for (size_t start = 0; start < pcm.size(); start += 441) {
+      dsss->ProcessPcm16(pcm.data() + start, static_cast<int>(std::min<size_t>(441, pcm.size() - start)));
+      decoded = dsss->DecodeTokens(&results, 6, 2) || decoded;
+    }
+    dsss_decoded += decoded;
+    woken_of_decoded += decoded && t <= 0.5;
     latency.push_back(t);
     peak.push_back(best);
   }
   std::sort(latency.begin(), latency.end());
   std::sort(peak.begin(), peak.end());
-  return {100 * woken / seeds, latency[seeds / 2], peak[seeds / 2]};
+  return {100 * woken / seeds, latency[seeds / 2], peak[seeds / 2], dsss_decoded, woken_of_decoded};
 }
 
 // Wake times for white and pink noise at several full-band SNRs, senders at
 // rest and at +-1 m/s, then in three rooms at several distances (+10 dB).
 int Latency(int seeds) {
   const auto encoder = audio_sorvane::MakeDsssEncoder({});
-  std::printf("%-22s %6s %7s %10s %12s %12s\n", "channel", "speed", "SNR dB", "woken<0.5s",
-              "median s", "median score");
+  std::printf("%-22s %6s %7s %10s %12s %12s %14s\n", "channel", "speed", "SNR dB", "woken<0.5s",
+              "median s", "median score", "woken/DSSS");
   const auto print = [](const char* name, double speed, double snr, const WakeStats& w) {
-    std::printf("%-22s %6.1f %7.1f %9d%% %12.3f %12.1f\n", name, speed, snr, w.woken_percent,
-                w.median_latency, w.median_peak);
+    std::printf("%-22s %6.1f %7.1f %9d%% %12.3f %12.1f %8d/%d\n", name, speed, snr, w.woken_percent,
+                w.median_latency, w.median_peak, w.woken_of_decoded, w.dsss_decoded);
     std::fflush(stdout);
   };
   for (NoiseKind kind : {NoiseKind::kWhite, NoiseKind::kPink}) {

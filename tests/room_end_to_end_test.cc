@@ -21,9 +21,12 @@ constexpr Room kRooms[] = {{"office", 4.0, 3.0, 2.5, 0.4},
 
 // One trial of `scheme` in `room` at `distance` m: 3 s of audio at +10 dB
 // white noise, an omni source, the phones' loudspeaker and microphone on.
-TrialResult RoomTrial(const Room& room, double distance, const char* scheme, uint64_t seed) {
+TrialResult RoomTrial(const Room& room, double distance, const char* scheme, uint64_t seed,
+                      double request_interval = 0.25, double leading_silence = 0.0) {
   LinkSetup setup;
   setup.scheme = scheme;
+  setup.request_interval = request_interval;
+  setup.channel.leading_silence = leading_silence;
   setup.seconds = 3.0;
   setup.channel.room = {.width = room.width,
                         .depth = room.depth,
@@ -48,6 +51,20 @@ TEST(RoomEndToEndTest, DecodesInReverberantRooms) {
             << scheme << " in the " << room.name << " at " << distance << " m"
             << (result.wrong_token ? ": wrong token" : ": no token");
       }
+    }
+  }
+}
+
+// Verifies that an app asking for tokens after every 10 ms block hears as
+// much as one asking every quarter second, a second of noise before the
+// broadcast: the requests made while it is still arriving see only its
+// first frames, and what they conclude about the sender must not stick.
+TEST(RoomEndToEndTest, RequestsOnEveryBlockLoseNothing) {
+  for (uint64_t seed = 90; seed < 98; ++seed) {
+    for (const char* scheme : {"dsss", "hotsound"}) {
+      const TrialResult result = RoomTrial(kRooms[0], 1.0, scheme, seed, 0.01, 1.0);
+      EXPECT_TRUE(result.success) << scheme << ", seed " << seed
+                                  << (result.wrong_token ? ": wrong token" : ": no token");
     }
   }
 }

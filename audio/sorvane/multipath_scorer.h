@@ -67,6 +67,7 @@ class MultipathScorer {
   // the view).
   float SearchDoppler(const BasebandView& view, int64_t start);
 
+
   // Follows a new transmission: frame k starts at anchor + round(k * period)
   // with the period that `doppler` implies. Forgets every cached frame.
   void StartTrack(int64_t anchor, float doppler);

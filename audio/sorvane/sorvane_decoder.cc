@@ -448,14 +448,19 @@ void SorvaneDecoder::ScoreGroupOverMultipath(const DecodingGroup& group,
   // that one was last seen) and its strongest frame lies on the track's
   // grid; otherwise it starts a new track with its own Doppler search. A
   // track found on a noise peak must not lend its Doppler to a broadcast
-  // that happens to fall on its grid.
+  // that happens to fall on its grid. Nor does a track keep a Doppler
+  // searched on a frame much weaker than the group now offers: a request
+  // made while a broadcast is still arriving sees only its first frames,
+  // whose summed scores are partial, and a search on them can land anywhere.
   const int64_t tolerance = std::lround(params_.max_phase_error * frame_size_);
   const int64_t first = discarded + times.front();
-  if (!multipath_->has_track() || first > track_last_seen_ + params_.max_gap ||
+  if (!multipath_->has_track() || reference->score > kResearchGain * track_reference_score_ ||
+      first > track_last_seen_ + params_.max_gap ||
       std::abs(reference->start -
                multipath_->FrameStart(multipath_->NearestFrame(reference->start))) > tolerance) {
     multipath_->StartTrack(reference->start,
                            multipath_->SearchDoppler(view, reference->start));
+    track_reference_score_ = reference->score;
   }
   track_last_seen_ = discarded + times.back();
   for (const SlotFrame& frame : frames) {

@@ -174,6 +174,10 @@ class SorvaneDecoder {
   std::map<int64_t, audio_dsp::FloatVector> symbol_score_cache_;
   std::unique_ptr<MultipathScorer> multipath_;
   int64_t track_last_seen_ = 0;  // the last detection of the track's transmission
+  float track_reference_score_ = 0.0f;  // of the frame its Doppler was searched on
+  // A group whose strongest frame beats the track's by this factor searches
+  // the Doppler again.
+  static constexpr float kResearchGain = 2.0f;
 
   // Scratch, kept to avoid allocation per block.
   std::vector<float> mono_;
