@@ -177,7 +177,7 @@ class SorvaneDecoder {
   float track_reference_score_ = 0.0f;  // of the frame its Doppler was searched on
   // A group whose strongest frame beats the track's by this factor searches
   // the Doppler again.
-  static constexpr float kResearchGain = 2.0f;
+  static constexpr float kResearchGain = 1.25f;
 
   // Scratch, kept to avoid allocation per block.
   std::vector<float> mono_;
