@@ -2,6 +2,7 @@
 
 #include <cmath>
 #include <numbers>
+#include <vector>
 
 #include "audio/dsp/float4.h"
 #include "audio/dsp/multiversion.h"
@@ -40,6 +41,38 @@ inline __attribute__((always_inline)) void Butterfly(Complex& a0, Complex& a1, C
   a3 = {t1.re - t3.re, t1.im - t3.im};
 }
 
+// Where stage `ns` of a transform of `size` writes: the output after the
+// last stage, else whichever scratch pair the previous stage did not.
+inline __attribute__((always_inline)) void StageDestination(int ns, int size, const float* src_re,
+                                                            float* out_re, float* out_im,
+                                                            float* a_re, float* a_im, float* b_re,
+                                                            float* b_im, float** dst_re,
+                                                            float** dst_im) {
+  const bool last = ns * 4 == size;
+  *dst_re = last ? out_re : src_re == a_re ? b_re : a_re;
+  *dst_im = last ? out_im : src_re == a_re ? b_im : a_im;
+}
+
+// Twiddles of every stage after the first, per group of `lanes` butterflies
+// and r = 1..3: exp(-2 pi i r k / (4 ns)) for lane l's k = (j + l) mod ns,
+// the real parts of the group, then the imaginary.
+std::vector<float> StageTwiddles(int size, int lanes) {
+  std::vector<float> twiddles;
+  for (int ns = 4; ns < size; ns *= 4) {
+    for (int j = 0; j < size / 4; j += lanes) {
+      for (int r = 1; r <= 3; ++r) {
+        for (int part = 0; part < 2; ++part) {
+          for (int lane = 0; lane < lanes; ++lane) {
+            const double angle = -2.0 * std::numbers::pi * r * ((j + lane) % ns) / (4.0 * ns);
+            twiddles.push_back(static_cast<float>(part == 0 ? std::cos(angle) : std::sin(angle)));
+          }
+        }
+      }
+    }
+  }
+  return twiddles;
+}
+
 // The transform of `size` values through the scratch pairs a and b, with
 // the stages' twiddles `w`.
 SORVEL_MULTIVERSION void Transform(int size, const float* w, const float* re, const float* im,
@@ -64,13 +97,7 @@ SORVEL_MULTIVERSION void Transform(int size, const float* w, const float* re, co
   const float* src_re = dst_re;
   const float* src_im = dst_im;
   for (int ns = 4; ns < size; ns *= 4) {
-    if (ns * 4 == size) {
-      dst_re = out_re;
-      dst_im = out_im;
-    } else {
-      dst_re = src_re == a_re ? b_re : a_re;
-      dst_im = src_im == a_im ? b_im : a_im;
-    }
+    StageDestination(ns, size, src_re, out_re, out_im, a_re, a_im, b_re, b_im, &dst_re, &dst_im);
     for (int j = 0; j < quarter; j += 4, w += 24) {
       Complex4 a0 = Load(src_re, src_im, j);
       Complex4 a1 = Multiply(Load(src_re, src_im, j + quarter), w);
@@ -153,13 +180,7 @@ SORVEL_WIDE void TransformWide(int size, const float* w, const float* re, const 
   const float* src_re = dst_re;
   const float* src_im = dst_im;
   for (int ns = 4; ns < size; ns *= 4) {
-    if (ns * 4 == size) {
-      dst_re = out_re;
-      dst_im = out_im;
-    } else {
-      dst_re = src_re == a_re ? b_re : a_re;
-      dst_im = src_im == a_im ? b_im : a_im;
-    }
+    StageDestination(ns, size, src_re, out_re, out_im, a_re, a_im, b_re, b_im, &dst_re, &dst_im);
     for (int j = 0; j < quarter; j += 8, w += 48) {
       ComplexWide a0 = SORVEL_LOAD_COMPLEX(src_re, src_im, j);
       ComplexWide a1 = SORVEL_LOAD_COMPLEX(src_re, src_im, j + quarter);
@@ -196,39 +217,10 @@ Radix4Fft::Radix4Fft(int size) : size_(size) {
   while (n > 1 && n % 4 == 0) n /= 4;
   CHECK(size >= 16 && n == 1);
   // Stage with sub-transforms of length ns (4, 16, ... size / 4): butterfly
-  // j (lane of a group of four) multiplies its inputs r = 1..3 by
-  // exp(-2 pi i r k / (4 ns)), k = j mod ns.
-  for (int ns = 4; ns < size; ns *= 4) {
-    for (int j = 0; j < size / 4; j += 4) {
-      for (int r = 1; r <= 3; ++r) {
-        float re[4], im[4];
-        for (int lane = 0; lane < 4; ++lane) {
-          const int k = (j + lane) % ns;
-          const double angle = -2.0 * std::numbers::pi * r * k / (4.0 * ns);
-          re[lane] = static_cast<float>(std::cos(angle));
-          im[lane] = static_cast<float>(std::sin(angle));
-        }
-        twiddles_.insert(twiddles_.end(), re, re + 4);
-        twiddles_.insert(twiddles_.end(), im, im + 4);
-      }
-    }
-  }
-  // The same per group of eight butterflies, for the eight-lane path.
-  for (int ns = 4; ns < size && size >= 64; ns *= 4) {
-    for (int j = 0; j < size / 4; j += 8) {
-      for (int r = 1; r <= 3; ++r) {
-        float re[8], im[8];
-        for (int lane = 0; lane < 8; ++lane) {
-          const int k = (j + lane) % ns;
-          const double angle = -2.0 * std::numbers::pi * r * k / (4.0 * ns);
-          re[lane] = static_cast<float>(std::cos(angle));
-          im[lane] = static_cast<float>(std::sin(angle));
-        }
-        wide_twiddles_.insert(wide_twiddles_.end(), re, re + 8);
-        wide_twiddles_.insert(wide_twiddles_.end(), im, im + 8);
-      }
-    }
-  }
+  // j multiplies its inputs r = 1..3 by exp(-2 pi i r k / (4 ns)),
+  // k = j mod ns; grouped by four lanes, and by eight for the wide path.
+  twiddles_ = StageTwiddles(size, 4);
+  if (size >= 64) wide_twiddles_ = StageTwiddles(size, 8);
   wide_ = !wide_twiddles_.empty() && HasWidePaths();
   a_re_.resize(size);
   a_im_.resize(size);
