@@ -29,11 +29,13 @@ typedef float Float8 __attribute__((vector_size(32)));
   std::memcpy(&name, (pointer), sizeof(Float8))
 #define SORVEL_STORE8(pointer, v) std::memcpy((pointer), &(v), sizeof(Float8))
 #define SORVEL_SPLAT8(x) (Float8{} + (x))
+#define SORVEL_MAX8(a, b) ((a) > (b) ? (a) : (b))
 #else
 using audio_dsp::Float8;
 #define SORVEL_LOAD8(name, pointer) const Float8 name = audio_dsp::Load8(pointer)
 #define SORVEL_STORE8(pointer, v) audio_dsp::Store8((pointer), (v))
 #define SORVEL_SPLAT8(x) audio_dsp::Splat8(x)
+#define SORVEL_MAX8(a, b) audio_dsp::Max8((a), (b))
 #endif
 #define SORVEL_SUM8(v) (((v)[0] + (v)[1]) + ((v)[2] + (v)[3]) + (((v)[4] + (v)[5]) + ((v)[6] + (v)[7])))
 
@@ -213,6 +215,37 @@ SORVEL_MULTIVERSION void FrequencyPowers(const float* phasors_real,
   }
 }
 
+// Per lane j of eight frames whose n powers are interleaved (powers[8 i +
+// j] is frequency i of frame j): their sum, added in the order of
+// AcquisitionScorer::FinishFrame's scalar loop (four interleaved partial
+// sums, the remainder on the first), so both give the same bits, and their
+// largest.
+SORVEL_MULTIVERSION void SumsAndPeaks8(const float* powers, int n, float* sums, float* peaks) {
+  Float8 s0 = {}, s1 = {}, s2 = {}, s3 = {};
+  SORVEL_LOAD8(first, powers);
+  Float8 top = first;
+  int i = 0;
+  for (; i + 4 <= n; i += 4) {
+    SORVEL_LOAD8(a, powers + 8 * i);
+    SORVEL_LOAD8(b, powers + 8 * (i + 1));
+    SORVEL_LOAD8(c, powers + 8 * (i + 2));
+    SORVEL_LOAD8(d, powers + 8 * (i + 3));
+    s0 += a;
+    s1 += b;
+    s2 += c;
+    s3 += d;
+    top = SORVEL_MAX8(top, SORVEL_MAX8(SORVEL_MAX8(a, b), SORVEL_MAX8(c, d)));
+  }
+  for (; i < n; ++i) {
+    SORVEL_LOAD8(a, powers + 8 * i);
+    s0 += a;
+    top = SORVEL_MAX8(top, a);
+  }
+  const Float8 sum = (s0 + s1) + (s2 + s3);
+  SORVEL_STORE8(sums, sum);
+  SORVEL_STORE8(peaks, top);
+}
+
 constexpr int kNoiseSmootherOrder = 2;
 
 // The noise smoother for a smoothing width of `width` frames: two gamma
@@ -269,6 +302,10 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
                              detection_window_size_ + 1 - frame_size_});
   history_rows_ = static_cast<int>(std::bit_ceil(static_cast<unsigned>(rows)));
   history_.assign(static_cast<size_t>(history_rows_) * num_frequencies_, 0.0f);
+  peak_rows_ = static_cast<int>(std::bit_ceil(static_cast<unsigned>(noise_delay_ + 1)));
+  peaks_.assign(peak_rows_, 0.0f);
+  batch_sums_.assign(8, 0.0f);
+  batch_peaks_.assign(8, 0.0f);
 
   chunk_size_ = static_cast<int>(
       std::ceil(static_cast<float>(frame_size_) / static_cast<float>(num_chunks_)));
@@ -324,12 +361,14 @@ void AcquisitionScorer::Reset(int64_t first_frame) {
   real_window_.Clear();
   imaginary_window_.Clear();
   std::fill(history_.begin(), history_.end(), 0.0f);
+  std::fill(peaks_.begin(), peaks_.end(), 0.0f);
 }
 
 void AcquisitionScorer::ZeroHistory() {
   std::fill(real_window_.samples.begin(), real_window_.samples.end(), 0.0f);
   std::fill(imaginary_window_.samples.begin(), imaginary_window_.samples.end(), 0.0f);
   std::fill(history_.begin(), history_.end(), 0.0f);
+  std::fill(peaks_.begin(), peaks_.end(), 0.0f);
 }
 
 void AcquisitionScorer::ScoreSamples(std::span<const float> baseband_real_signal,
@@ -376,9 +415,8 @@ void AcquisitionScorer::ScoreSamples(std::span<const float> baseband_real_signal
                              corr_imaginary, num_frequencies_, num_chunks_,
                              batch_powers_.data());
           }
+          FinishFrames8(batch_powers_.data(), acquisition_scores);
           for (int j = 0; j < 8; ++j) {
-            const float score = FinishFrame(batch_powers_.data() + j, 8);
-            if (frame_counter_ - first_frame_ > noise_delay_) acquisition_scores->push_back(score);
             real_window_.Advance();
             imaginary_window_.Advance();
           }
@@ -407,18 +445,17 @@ float AcquisitionScorer::ScoreFrame(std::span<const float> baseband_frame_real,
 }
 
 float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
-  const int64_t n = frame_counter_;
-  const int64_t age = n - first_frame_;
-  float* power = HistoryRow(n);
+  float* power = HistoryRow(frame_counter_);
   // Sums and maxima in four interleaved parts: one running value would make
-  // every step wait on the previous one.
+  // every step wait on the previous one. SumsAndPeaks8 adds in this order.
   float s0 = 0.0f, s1 = 0.0f, s2 = 0.0f, s3 = 0.0f;
+  float peak = powers[0];
   int i = 0;
   for (; i + 4 <= num_frequencies_; i += 4) {
-    power[i] = powers[i * stride];
-    power[i + 1] = powers[(i + 1) * stride];
-    power[i + 2] = powers[(i + 2) * stride];
-    power[i + 3] = powers[(i + 3) * stride];
+    for (int k = 0; k < 4; ++k) {
+      power[i + k] = powers[(i + k) * stride];
+      peak = std::max(peak, power[i + k]);
+    }
     s0 += power[i];
     s1 += power[i + 1];
     s2 += power[i + 2];
@@ -426,10 +463,27 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
   }
   for (; i < num_frequencies_; ++i) {
     power[i] = powers[i * stride];
+    peak = std::max(peak, power[i]);
     s0 += power[i];
   }
-  const float power_sum = (s0 + s1) + (s2 + s3);
+  Peak(frame_counter_) = peak;
+  return ScoreStored((s0 + s1) + (s2 + s3));
+}
 
+void AcquisitionScorer::FinishFrames8(const float* powers, std::vector<float>* scores) {
+  SumsAndPeaks8(powers, num_frequencies_, batch_sums_.data(), batch_peaks_.data());
+  for (int j = 0; j < 8; ++j) {
+    float* row = HistoryRow(frame_counter_);
+    for (int i = 0; i < num_frequencies_; ++i) row[i] = powers[8 * i + j];
+    Peak(frame_counter_) = batch_peaks_[j];
+    const float score = ScoreStored(batch_sums_[j]);
+    if (frame_counter_ - first_frame_ > noise_delay_) scores->push_back(score);
+  }
+}
+
+float AcquisitionScorer::ScoreStored(float power_sum) {
+  const int64_t n = frame_counter_;
+  const int64_t age = n - first_frame_;
   float score = 0.0f;
   if (age == warmup_frames_ - 1) {
     float sum = 0.0f;
@@ -441,20 +495,7 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
   } else if (age > warmup_frames_ - 1) {
     noise_level_ = noise_smoother_.ProcessSample(power_sum / static_cast<float>(num_frequencies_));
   }
-  if (age >= warmup_frames_ - 1) {
-    const float* delayed = HistoryRow(n - noise_delay_);
-    float m0 = delayed[0], m1 = delayed[0], m2 = delayed[0], m3 = delayed[0];
-    int k = 1;
-    for (; k + 4 <= num_frequencies_; k += 4) {
-      m0 = std::max(m0, delayed[k]);
-      m1 = std::max(m1, delayed[k + 1]);
-      m2 = std::max(m2, delayed[k + 2]);
-      m3 = std::max(m3, delayed[k + 3]);
-    }
-    for (; k < num_frequencies_; ++k) m0 = std::max(m0, delayed[k]);
-    const float peak = std::max(std::max(m0, m1), std::max(m2, m3));
-    score = peak / (noise_level_ + 1e-12f);
-  }
+  if (age >= warmup_frames_ - 1) score = Peak(n - noise_delay_) / (noise_level_ + 1e-12f);
   ++frame_counter_;
   return score;
 }

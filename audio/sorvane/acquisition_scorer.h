@@ -93,10 +93,17 @@ class AcquisitionScorer {
   // frame frame_counter_ - N.
   float ScoreFrame(std::span<const float> baseband_frame_real,
                    std::span<const float> baseband_frame_imaginary);
-  // Stores the frequency powers (num_frequencies_ values `stride` apart) in
-  // the history, updates the noise level and returns the score of frame
+  // Stores the frequency powers (num_frequencies_ values `stride` apart) of
+  // frame frame_counter_ in the history and returns the score of frame
   // counter - N.
   float FinishFrame(const float* powers, int stride);
+  // The same for eight frames whose powers are interleaved (out[8 i + j] is
+  // frequency i of frame j); appends the scores that are due.
+  void FinishFrames8(const float* powers, std::vector<float>* scores);
+  // Updates the noise level with frame frame_counter_'s power sum (its
+  // powers and peak already stored), advances the counter and returns the
+  // score of frame counter - N.
+  float ScoreStored(float power_sum);
 
   int frame_size_;
   int num_frequencies_;
@@ -142,6 +149,12 @@ class AcquisitionScorer {
   const float* HistoryRow(int64_t frame) const {
     return history_.data() + (frame & (history_rows_ - 1)) * num_frequencies_;
   }
+  // Each recent frame's largest frequency power, by frame & (peak_rows_ - 1):
+  // the score's numerator, taken while the powers are at hand.
+  int peak_rows_ = 0;
+  std::vector<float> peaks_;
+  float& Peak(int64_t frame) { return peaks_[frame & (peak_rows_ - 1)]; }
+  std::vector<float> batch_sums_, batch_peaks_;  // FinishFrames8's, 8 each
 };
 
 }  // namespace audio_sorvane

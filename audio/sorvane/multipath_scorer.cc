@@ -261,8 +261,8 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
     for (double p : power_) sum += p * p;
     return sum;
   };
-  const auto add_power = [&](const std::vector<std::complex<float>>& profile) {
-    const float* p = reinterpret_cast<const float*>(profile.data());
+  const auto add_power = [&](const std::complex<float>* profile) {
+    const float* p = reinterpret_cast<const float*>(profile);
     for (int m = 0; m < lags_; ++m) power_[m] += p[2 * m] * p[2 * m] + p[2 * m + 1] * p[2 * m + 1];
   };
   float best = 0.0f;
@@ -295,12 +295,12 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
   for (int b = -bins; b <= bins; ++b) {
     std::fill(power_.begin(), power_.end(), 0.0);
     for (int j = 0; j < frames; ++j) {
-      // Derotating by b bins takes bin k + b to bin k.
-      for (int k = 0; k < n; ++k) spectrum_[k] = spectra[j][(k + b + n) % n];
+      // Derotating by b bins takes bin k + b to bin k: a cyclic shift.
+      const auto from = spectra[j].begin() + (b + n) % n;
+      std::copy(spectra[j].begin(), from, std::copy(from, spectra[j].end(), spectrum_.begin()));
       Multiply(spectrum_.data(), code_spectrum_.data(), n, false);
       fft_.Inverse(spectrum_.data(), buffer_.data());
-      search_frame_.profile.assign(buffer_.begin(), buffer_.begin() + lags_);
-      add_power(search_frame_.profile);
+      add_power(buffer_.data());
     }
     consider(std::clamp(b * bin, -params_.max_doppler, params_.max_doppler), peakiness());
   }
@@ -316,7 +316,7 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
       const int64_t frame_start = start + std::llround(j * period);
       if (!HasWindow(view, frame_start)) break;
       Transform(view, frame_start, false, &search_frame_);
-      add_power(search_frame_.profile);
+      add_power(search_frame_.profile.data());
     }
     consider(doppler, peakiness());
   };
