@@ -1,5 +1,6 @@
 #include "audio/dsp/radix4_fft.h"
 
+#include <bit>
 #include <cmath>
 #include <numbers>
 #include <vector>
@@ -244,6 +245,109 @@ void Radix4Fft::Forward(const float* re, const float* im, float* out_re, float* 
 #endif
   Transform(size_, twiddles_.data(), re, im, out_re, out_im, a_re_.data(), a_im_.data(),
             b_re_.data(), b_im_.data());
+}
+
+namespace {
+
+int RadixFourLength(int size) {
+  CHECK(size >= 16 && std::has_single_bit(static_cast<unsigned>(size)));
+  return std::countr_zero(static_cast<unsigned>(size)) % 2 == 0 ? size : size / 2;
+}
+
+}  // namespace
+
+PowerOfTwoFft::PowerOfTwoFft(int size, bool normalize_inverse)
+    : size_(size),
+      half_(RadixFourLength(size)),
+      normalize_inverse_(normalize_inverse),
+      fft_(half_),
+      even_re_(half_),
+      even_im_(half_),
+      odd_re_(half_),
+      odd_im_(half_) {
+  if (half_ == size_) return;
+  for (int k = 0; k < half_; ++k) {
+    const double angle = -2.0 * std::numbers::pi * k / size_;
+    twiddle_re_.push_back(static_cast<float>(std::cos(angle)));
+    twiddle_im_.push_back(static_cast<float>(std::sin(angle)));
+  }
+}
+
+void PowerOfTwoFft::Run(const std::complex<float>* input, std::complex<float>* output,
+                        bool inverse) {
+  if (inverse) {
+    Pass<true>(input, output, normalize_inverse_ ? 1.0f / static_cast<float>(size_) : 1.0f);
+  } else {
+    Pass<false>(input, output, 1.0f);
+  }
+}
+
+// Interleaves four real and four imaginary parts into four complex values
+// at y.
+inline void StoreInterleaved(float* y, Float4 re, Float4 im) {
+  Store4(y, __builtin_shufflevector(re, im, 0, 4, 1, 5));
+  Store4(y + 4, __builtin_shufflevector(re, im, 2, 6, 3, 7));
+}
+
+template <bool kInverse>
+void PowerOfTwoFft::Pass(const std::complex<float>* input, std::complex<float>* output,
+                         float scale) {
+  // The inverse is the forward transform of the input with real and
+  // imaginary parts swapped, swapped back (see Radix4Fft::Inverse). Four
+  // values at a time: sizes are multiples of 16.
+  const float* x = reinterpret_cast<const float*>(input);
+  float* y = reinterpret_cast<float*>(output);
+  float* const er = kInverse ? even_im_.data() : even_re_.data();
+  float* const ei = kInverse ? even_re_.data() : even_im_.data();
+  float* const odr = kInverse ? odd_im_.data() : odd_re_.data();
+  float* const odi = kInverse ? odd_re_.data() : odd_im_.data();
+  const Float4 gain = Splat4(scale);
+  if (half_ == size_) {
+    for (int m = 0; m < size_; m += 4) {
+      const Float4 a = Load4(x + 2 * m), b = Load4(x + 2 * m + 4);
+      Store4(er + m, __builtin_shufflevector(a, b, 0, 2, 4, 6));
+      Store4(ei + m, __builtin_shufflevector(a, b, 1, 3, 5, 7));
+    }
+    fft_.Forward(even_re_.data(), even_im_.data(), even_re_.data(), even_im_.data());
+    for (int k = 0; k < size_; k += 4) {
+      StoreInterleaved(y + 2 * k, Load4(er + k) * gain, Load4(ei + k) * gain);
+    }
+    return;
+  }
+  for (int m = 0; m < half_; m += 4) {
+    // Complex samples 2m .. 2m + 7: rows become even re, even im, odd re, odd im.
+    Float4 v0 = Load4(x + 4 * m), v1 = Load4(x + 4 * m + 4);
+    Float4 v2 = Load4(x + 4 * m + 8), v3 = Load4(x + 4 * m + 12);
+    Transpose4(v0, v1, v2, v3);
+    Store4(er + m, v0);
+    Store4(ei + m, v1);
+    Store4(odr + m, v2);
+    Store4(odi + m, v3);
+  }
+  fft_.Forward(even_re_.data(), even_im_.data(), even_re_.data(), even_im_.data());
+  fft_.Forward(odd_re_.data(), odd_im_.data(), odd_re_.data(), odd_im_.data());
+  // X[k] = E[k] + w^k O[k], X[k + size / 2] = E[k] - w^k O[k], on the
+  // transform's own real and imaginary parts (swapped for the inverse).
+  const float* fr = even_re_.data();
+  const float* fi = even_im_.data();
+  const float* gr = odd_re_.data();
+  const float* gi = odd_im_.data();
+  float* upper = y + 2 * half_;
+  for (int k = 0; k < half_; k += 4) {
+    const Float4 wr = Load4(twiddle_re_.data() + k), wi = Load4(twiddle_im_.data() + k);
+    const Float4 orr = Load4(gr + k), oi = Load4(gi + k);
+    const Float4 tr = wr * orr - wi * oi, ti = wr * oi + wi * orr;
+    const Float4 e_re = Load4(fr + k), e_im = Load4(fi + k);
+    const Float4 lo_re = (e_re + tr) * gain, lo_im = (e_im + ti) * gain;
+    const Float4 hi_re = (e_re - tr) * gain, hi_im = (e_im - ti) * gain;
+    if (kInverse) {
+      StoreInterleaved(y + 2 * k, lo_im, lo_re);
+      StoreInterleaved(upper + 2 * k, hi_im, hi_re);
+    } else {
+      StoreInterleaved(y + 2 * k, lo_re, lo_im);
+      StoreInterleaved(upper + 2 * k, hi_re, hi_im);
+    }
+  }
 }
 
 }  // namespace audio_dsp

@@ -47,5 +47,29 @@ TEST(Radix4FftTest, MatchesGeneralTransform) {
   }
 }
 
+// The power-of-two transform against the general one at odd and even
+// powers of two, both directions (the inverse normalised), in place and not.
+TEST(PowerOfTwoFftTest, MatchesGeneralTransform) {
+  std::mt19937 rng(6);
+  std::normal_distribution<float> normal;
+  for (int size : {16, 32, 128, 256, 2048}) {
+    std::vector<std::complex<float>> x(size), forward(size), inverse(size);
+    for (auto& v : x) v = {normal(rng), normal(rng)};
+    ComplexFFTTransformer reference(size, /*normalize_inverse=*/true);
+    reference.Forward(x.data(), forward.data());
+    reference.Inverse(x.data(), inverse.data());
+    PowerOfTwoFft fft(size, /*normalize_inverse=*/true);
+    ASSERT_EQ(fft.GetSize(), size);
+    std::vector<std::complex<float>> out(size), in_place = x;
+    fft.Forward(x.data(), out.data());
+    fft.Inverse(in_place.data(), in_place.data());
+    const float tolerance = 1e-5f * std::sqrt(static_cast<float>(size)) * std::log2(static_cast<float>(size));
+    for (int k = 0; k < size; ++k) {
+      ASSERT_LT(std::abs(out[k] - forward[k]), tolerance) << size << " bin " << k;
+      ASSERT_LT(std::abs(in_place[k] - inverse[k]), tolerance / size) << size << " sample " << k;
+    }
+  }
+}
+
 }  // namespace
 }  // namespace audio_dsp

@@ -1,6 +1,7 @@
 #include "audio/sorvane/multipath_scorer.h"
 
 #include <algorithm>
+#include <bit>
 #include <cmath>
 #include <limits>
 #include <numbers>
@@ -9,11 +10,6 @@
 
 namespace audio_sorvane {
 namespace {
-
-int FastSizeAtLeast(int n) {
-  while (!audio_dsp::IsFastFFTSize(n)) ++n;
-  return n;
-}
 
 // Complex loops on interleaved floats: std::complex's multiply carries a
 // NaN fallback that keeps these loops scalar and branchy.
@@ -109,7 +105,8 @@ MultipathScorer::MultipathScorer(const SymbolWaveCoder& coder,
       use_quadrature_(coder.params().use_quadrature),
       code_(coder.baseband_code()),
       tones_(coder.baseband_tones()),
-      fft_(FastSizeAtLeast(window_), /*normalize_inverse=*/true) {
+      fft_(std::max(16, static_cast<int>(std::bit_ceil(static_cast<unsigned>(window_)))),
+           /*normalize_inverse=*/true) {
   CHECK(params_.lead >= 0);
   CHECK(params_.span >= 0);
   CHECK(params_.channel_frames >= 0);
@@ -238,7 +235,6 @@ void MultipathScorer::Transform(const BasebandView& view, int64_t start, bool ke
     Borrow(&window_pool_, &frame->window);
     frame->window.assign(buffer_.begin(), buffer_.begin() + window_);
   }
-  // Out of place: KISS FFT allocates a temporary for in-place transforms.
   fft_.Forward(buffer_.data(), spectrum_.data());
   if (keep_window) {
     Borrow(&spectrum_pool_, &frame->spectrum);

@@ -30,7 +30,7 @@
 #include <vector>
 
 #include "audio/dsp/eigen_types.h"
-#include "audio/dsp/kiss_fft.h"
+#include "audio/dsp/radix4_fft.h"
 #include "audio/sorvane/symbol_wave_coder.h"
 
 namespace audio_sorvane {
@@ -137,7 +137,7 @@ class MultipathScorer {
   bool use_quadrature_;
   std::vector<float> code_;
   const audio_dsp::FloatMatrix& tones_;  // the coder's, which outlives the scorer
-  audio_dsp::ComplexFFTTransformer fft_;
+  audio_dsp::PowerOfTwoFft fft_;
   std::vector<std::complex<float>> code_spectrum_;  // conjugated
 
   bool has_track_ = false;
