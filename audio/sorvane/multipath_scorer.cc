@@ -271,11 +271,15 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
   };
 
   // Coarse grid: offsets of whole FFT bins, which shift the spectrum of the
-  // window instead of derotating it, so each frame is transformed once. A
-  // bin is about two thirds of a cycle per frame, where a half-bin error
-  // still keeps most of the power. Frames are taken a nominal period apart.
+  // window instead of derotating it, so each frame is transformed once. The
+  // grid steps by the whole bins nearest to kCoarseStep cycles per frame,
+  // where a half-step error still keeps most of the power. Frames are taken
+  // a nominal period apart.
+  constexpr float kCoarseStep = 0.6f;
   const int n = fft_.GetSize();
-  const float bin = static_cast<float>(frame_size_) / static_cast<float>(n);
+  const int stride = std::max(
+      1, static_cast<int>(std::lround(kCoarseStep * static_cast<float>(n) / static_cast<float>(frame_size_))));
+  const float bin = static_cast<float>(stride * frame_size_) / static_cast<float>(n);
   const int bins = static_cast<int>(std::floor(params_.max_doppler / bin + 0.5f));
   std::vector<std::vector<std::complex<float>>>& spectra = search_spectra_;
   spectra.resize(params_.doppler_frames);
@@ -291,8 +295,8 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
   for (int b = -bins; b <= bins; ++b) {
     std::fill(power_.begin(), power_.end(), 0.0);
     for (int j = 0; j < frames; ++j) {
-      // Derotating by b bins takes bin k + b to bin k: a cyclic shift.
-      const auto from = spectra[j].begin() + (b + n) % n;
+      // Derotating by b steps takes bin k + b stride to bin k: a cyclic shift.
+      const auto from = spectra[j].begin() + ((b * stride) % n + n) % n;
       std::copy(spectra[j].begin(), from, std::copy(from, spectra[j].end(), spectrum_.begin()));
       Multiply(spectrum_.data(), code_spectrum_.data(), n, false);
       fft_.Inverse(spectrum_.data(), buffer_.data());
