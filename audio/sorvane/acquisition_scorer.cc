@@ -28,7 +28,9 @@ typedef float Float8 __attribute__((vector_size(32)));
   Float8 name;                      \
   std::memcpy(&name, (pointer), sizeof(Float8))
 #define SORVEL_STORE8(pointer, v) std::memcpy((pointer), &(v), sizeof(Float8))
-#define SORVEL_SPLAT8(x) (Float8{} + (x))
+// Listing the lanes lets the compiler broadcast straight from memory; adding
+// the scalar to a zero vector would cost an addition (x + 0 is not x for -0).
+#define SORVEL_SPLAT8(x) (Float8{(x), (x), (x), (x), (x), (x), (x), (x)})
 #define SORVEL_MAX8(a, b) ((a) > (b) ? (a) : (b))
 #else
 using audio_dsp::Float8;
@@ -161,7 +163,39 @@ SORVEL_MULTIVERSION void PairedFrequencyPowers8(const float* cosines, const floa
                                                 const float* corr_imaginary, int num_pairs,
                                                 bool has_zero, int num_chunks, float* out) {
   const int n = 2 * num_pairs + (has_zero ? 1 : 0);
-  for (int p = 0; p < num_pairs; ++p) {
+  const auto store = [&](int p, Float8 ar, Float8 ai, Float8 br, Float8 bi) {
+    const Float8 plus_re = ar - bi, plus_im = ai + br;
+    const Float8 minus_re = ar + bi, minus_im = ai - br;
+    const Float8 plus = plus_re * plus_re + plus_im * plus_im;
+    const Float8 minus = minus_re * minus_re + minus_im * minus_im;
+    SORVEL_STORE8(out + 8 * p, plus);
+    SORVEL_STORE8(out + 8 * (n - 1 - p), minus);
+  };
+  int p = 0;
+  // Two pairs per pass: eight independent sums hide the multiply-add
+  // latency, and each correlation loaded serves both.
+  for (; p + 2 <= num_pairs; p += 2) {
+    const float* cs = cosines + p * num_chunks;
+    const float* sn = sines + p * num_chunks;
+    Float8 ar = {}, ai = {}, br = {}, bi = {}, cr = {}, ci = {}, dr = {}, di = {};
+    for (int c = 0; c < num_chunks; ++c) {
+      SORVEL_LOAD8(x, corr_real + 8 * c);
+      SORVEL_LOAD8(y, corr_imaginary + 8 * c);
+      const Float8 cv = SORVEL_SPLAT8(cs[c]), sv = SORVEL_SPLAT8(sn[c]);
+      const Float8 cw = SORVEL_SPLAT8(cs[num_chunks + c]), sw = SORVEL_SPLAT8(sn[num_chunks + c]);
+      ar += cv * x;
+      ai += cv * y;
+      br += sv * x;
+      bi += sv * y;
+      cr += cw * x;
+      ci += cw * y;
+      dr += sw * x;
+      di += sw * y;
+    }
+    store(p, ar, ai, br, bi);
+    store(p + 1, cr, ci, dr, di);
+  }
+  for (; p < num_pairs; ++p) {
     const float* cs = cosines + p * num_chunks;
     const float* sn = sines + p * num_chunks;
     Float8 ar = {}, ai = {}, br = {}, bi = {};
@@ -174,12 +208,7 @@ SORVEL_MULTIVERSION void PairedFrequencyPowers8(const float* cosines, const floa
       br += sv * x;
       bi += sv * y;
     }
-    const Float8 plus_re = ar - bi, plus_im = ai + br;
-    const Float8 minus_re = ar + bi, minus_im = ai - br;
-    const Float8 plus = plus_re * plus_re + plus_im * plus_im;
-    const Float8 minus = minus_re * minus_re + minus_im * minus_im;
-    SORVEL_STORE8(out + 8 * p, plus);
-    SORVEL_STORE8(out + 8 * (n - 1 - p), minus);
+    store(p, ar, ai, br, bi);
   }
   if (has_zero) {
     Float8 re = {}, im = {};
@@ -302,7 +331,8 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
                              detection_window_size_ + 1 - frame_size_});
   history_rows_ = static_cast<int>(std::bit_ceil(static_cast<unsigned>(rows)));
   history_.assign(static_cast<size_t>(history_rows_) * num_frequencies_, 0.0f);
-  peak_rows_ = static_cast<int>(std::bit_ceil(static_cast<unsigned>(noise_delay_ + 1)));
+  // Room for a batch of eight ahead of the delayed frame.
+  peak_rows_ = static_cast<int>(std::bit_ceil(static_cast<unsigned>(noise_delay_ + 8)));
   peaks_.assign(peak_rows_, 0.0f);
   batch_sums_.assign(8, 0.0f);
   batch_peaks_.assign(8, 0.0f);
@@ -472,6 +502,26 @@ float AcquisitionScorer::FinishFrame(const float* powers, int stride) {
 
 void AcquisitionScorer::FinishFrames8(const float* powers, std::vector<float>* scores) {
   SumsAndPeaks8(powers, num_frequencies_, batch_sums_.data(), batch_peaks_.data());
+  if (frame_counter_ - first_frame_ >= warmup_frames_) {
+    // Past the warm-up: the noise smoother runs over the eight frames with
+    // its stages in registers, the same arithmetic as ScoreStored's.
+    float levels[8];
+    for (int j = 0; j < 8; ++j) {
+      float* row = HistoryRow(frame_counter_ + j);
+      for (int i = 0; i < num_frequencies_; ++i) row[i] = powers[8 * i + j];
+      Peak(frame_counter_ + j) = batch_peaks_[j];
+      levels[j] = batch_sums_[j] / static_cast<float>(num_frequencies_);
+    }
+    noise_smoother_.ProcessBlock(levels, 8, levels);
+    noise_level_ = levels[7];
+    for (int j = 0; j < 8; ++j) {
+      const int64_t n = frame_counter_ + j;
+      const float score = Peak(n - noise_delay_) / (levels[j] + 1e-12f);
+      if (n - first_frame_ > noise_delay_) scores->push_back(score);
+    }
+    frame_counter_ += 8;
+    return;
+  }
   for (int j = 0; j < 8; ++j) {
     float* row = HistoryRow(frame_counter_);
     for (int i = 0; i < num_frequencies_; ++i) row[i] = powers[8 * i + j];
