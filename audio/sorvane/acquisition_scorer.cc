@@ -275,6 +275,58 @@ SORVEL_MULTIVERSION void SumsAndPeaks8(const float* powers, int n, float* sums, 
   SORVEL_STORE8(peaks, top);
 }
 
+// rows[j][i] = powers[8 i + j] for i < n, j < 8: eight frames' interleaved
+// powers written to their history rows. On x86 eight values of each row at
+// a time through an 8 x 8 transpose in registers.
+SORVEL_MULTIVERSION void Deinterleave8(const float* powers, int n, float* const* rows) {
+  int i = 0;
+#if defined(__x86_64__)
+  for (; i + 8 <= n; i += 8) {
+    const float* p = powers + 8 * i;
+    SORVEL_LOAD8(r0, p);
+    SORVEL_LOAD8(r1, p + 8);
+    SORVEL_LOAD8(r2, p + 16);
+    SORVEL_LOAD8(r3, p + 24);
+    SORVEL_LOAD8(r4, p + 32);
+    SORVEL_LOAD8(r5, p + 40);
+    SORVEL_LOAD8(r6, p + 48);
+    SORVEL_LOAD8(r7, p + 56);
+    // Pairs of rows interleaved, then pairs of pairs, then the halves.
+#define SORVEL_LOW(a, b) __builtin_shufflevector(a, b, 0, 8, 1, 9, 4, 12, 5, 13)
+#define SORVEL_HIGH(a, b) __builtin_shufflevector(a, b, 2, 10, 3, 11, 6, 14, 7, 15)
+    const Float8 t0 = SORVEL_LOW(r0, r1), t1 = SORVEL_HIGH(r0, r1);
+    const Float8 t2 = SORVEL_LOW(r2, r3), t3 = SORVEL_HIGH(r2, r3);
+    const Float8 t4 = SORVEL_LOW(r4, r5), t5 = SORVEL_HIGH(r4, r5);
+    const Float8 t6 = SORVEL_LOW(r6, r7), t7 = SORVEL_HIGH(r6, r7);
+#undef SORVEL_LOW
+#undef SORVEL_HIGH
+#define SORVEL_LOW(a, b) __builtin_shufflevector(a, b, 0, 1, 8, 9, 4, 5, 12, 13)
+#define SORVEL_HIGH(a, b) __builtin_shufflevector(a, b, 2, 3, 10, 11, 6, 7, 14, 15)
+    const Float8 u0 = SORVEL_LOW(t0, t2), u1 = SORVEL_HIGH(t0, t2);
+    const Float8 u2 = SORVEL_LOW(t1, t3), u3 = SORVEL_HIGH(t1, t3);
+    const Float8 u4 = SORVEL_LOW(t4, t6), u5 = SORVEL_HIGH(t4, t6);
+    const Float8 u6 = SORVEL_LOW(t5, t7), u7 = SORVEL_HIGH(t5, t7);
+#undef SORVEL_LOW
+#undef SORVEL_HIGH
+#define SORVEL_HALVES(j, a, b)                                                            \
+  {                                                                                       \
+    const Float8 low = __builtin_shufflevector(a, b, 0, 1, 2, 3, 8, 9, 10, 11);          \
+    const Float8 high = __builtin_shufflevector(a, b, 4, 5, 6, 7, 12, 13, 14, 15);       \
+    SORVEL_STORE8(rows[j] + i, low);                                                      \
+    SORVEL_STORE8(rows[j + 4] + i, high);                                                 \
+  }
+    SORVEL_HALVES(0, u0, u4)
+    SORVEL_HALVES(1, u1, u5)
+    SORVEL_HALVES(2, u2, u6)
+    SORVEL_HALVES(3, u3, u7)
+#undef SORVEL_HALVES
+  }
+#endif
+  for (; i < n; ++i) {
+    for (int j = 0; j < 8; ++j) rows[j][i] = powers[8 * i + j];
+  }
+}
+
 constexpr int kNoiseSmootherOrder = 2;
 
 // The noise smoother for a smoothing width of `width` frames: two gamma
@@ -506,9 +558,10 @@ void AcquisitionScorer::FinishFrames8(const float* powers, std::vector<float>* s
     // Past the warm-up: the noise smoother runs over the eight frames with
     // its stages in registers, the same arithmetic as ScoreStored's.
     float levels[8];
+    float* rows[8];
+    for (int j = 0; j < 8; ++j) rows[j] = HistoryRow(frame_counter_ + j);
+    Deinterleave8(powers, num_frequencies_, rows);
     for (int j = 0; j < 8; ++j) {
-      float* row = HistoryRow(frame_counter_ + j);
-      for (int i = 0; i < num_frequencies_; ++i) row[i] = powers[8 * i + j];
       Peak(frame_counter_ + j) = batch_peaks_[j];
       levels[j] = batch_sums_[j] / static_cast<float>(num_frequencies_);
     }
