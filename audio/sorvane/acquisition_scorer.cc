@@ -41,37 +41,8 @@ using audio_dsp::Float8;
 #endif
 #define SORVEL_SUM8(v) (((v)[0] + (v)[1]) + ((v)[2] + (v)[3]) + (((v)[4] + (v)[5]) + ((v)[6] + (v)[7])))
 
-// re/im correlation of each chunk of `code` with the frame.
-SORVEL_MULTIVERSION void CorrelateChunks(const float* code, const float* frame_real,
-                                         const float* frame_imaginary, int num_chunks,
-                                         int chunk_size, int last_chunk_size,
-                                         float* out_real, float* out_imaginary) {
-  for (int c = 0; c < num_chunks; ++c) {
-    const int offset = c * chunk_size;
-    const int size = c + 1 < num_chunks ? chunk_size : last_chunk_size;
-    const float* t = code + offset;
-    const float* re = frame_real + offset;
-    const float* im = frame_imaginary + offset;
-    Float8 sum_re = {}, sum_im = {};
-    int k = 0;
-    for (; k + 8 <= size; k += 8) {
-      SORVEL_LOAD8(tv, t + k);
-      SORVEL_LOAD8(rv, re + k);
-      SORVEL_LOAD8(iv, im + k);
-      sum_re += tv * rv;
-      sum_im += tv * iv;
-    }
-    float tail_re = 0.0f, tail_im = 0.0f;
-    for (; k < size; ++k) {
-      tail_re += t[k] * re[k];
-      tail_im += t[k] * im[k];
-    }
-    out_real[c] = SORVEL_SUM8(sum_re) + tail_re;
-    out_imaginary[c] = SORVEL_SUM8(sum_im) + tail_im;
-  }
-}
-
-// The same for eight consecutive frames at once: lane j of each sum is the
+// The re/im correlation of each chunk of `code` with eight consecutive
+// frames: lane j of each sum is the
 // frame starting j samples later. Broadcasting the template value needs no
 // horizontal sums, which dominate the one-frame version.
 SORVEL_MULTIVERSION void CorrelateChunks8(const float* code, const float* frame_real,
@@ -223,27 +194,6 @@ SORVEL_MULTIVERSION void PairedFrequencyPowers8(const float* cosines, const floa
   }
 }
 
-// power[i] = |sum_c phasor[i][c] corr[c]|^2. The phasors are stored by
-// chunk, `padded` frequencies (a multiple of 8) per chunk, so the loop runs
-// across frequencies and needs no horizontal sums.
-SORVEL_MULTIVERSION void FrequencyPowers(const float* phasors_real,
-                                         const float* phasors_imaginary,
-                                         const float* corr_real, const float* corr_imaginary,
-                                         int num_chunks, int padded, float* power) {
-  for (int i = 0; i < padded; i += 8) {
-    Float8 acc_re = {}, acc_im = {};
-    for (int c = 0; c < num_chunks; ++c) {
-      SORVEL_LOAD8(a, phasors_real + c * padded + i);
-      SORVEL_LOAD8(b, phasors_imaginary + c * padded + i);
-      const Float8 x = SORVEL_SPLAT8(corr_real[c]), y = SORVEL_SPLAT8(corr_imaginary[c]);
-      acc_re += a * x - b * y;
-      acc_im += a * y + b * x;
-    }
-    const Float8 p = acc_re * acc_re + acc_im * acc_im;
-    SORVEL_STORE8(power + i, p);
-  }
-}
-
 // Per lane j of eight frames whose n powers are interleaved (powers[8 i +
 // j] is frequency i of frame j): their sum, added in the order of
 // AcquisitionScorer::FinishFrame's scalar loop (four interleaved partial
@@ -342,7 +292,7 @@ audio_dsp::GammaFilter MakeNoiseSmoother(double width) {
 }  // namespace
 
 size_t AcquisitionScorer::FrameWindow::Fill(std::span<const float> input) {
-  const size_t n = std::min(input.size(), samples.size() - write);
+  const size_t n = std::min(input.size(), static_cast<size_t>(capacity - write));
   std::copy_n(input.begin(), n, samples.begin() + write);
   write += static_cast<int>(n);
   return n;
@@ -350,7 +300,7 @@ size_t AcquisitionScorer::FrameWindow::Fill(std::span<const float> input) {
 
 void AcquisitionScorer::FrameWindow::Advance() {
   ++read;
-  if (read > static_cast<int>(samples.size()) - frame_size) {
+  if (read > capacity - frame_size) {
     std::copy(samples.begin() + read, samples.begin() + write, samples.begin());
     write -= read;
     shifted += read;
@@ -395,10 +345,6 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
   code_.assign(code_template.begin(), code_template.end());
   std::vector<float> steps(frequency_offsets.begin(), frequency_offsets.end());
   PhasorMatrix(steps, num_chunks_, 2.0 * std::numbers::pi / num_chunks_, &phasor_matrix_);
-  padded_frequencies_ = (num_frequencies_ + 7) / 8 * 8;
-  correlations_real_.assign(num_chunks_, 0.0f);
-  correlations_imaginary_.assign(num_chunks_, 0.0f);
-  powers_.assign(padded_frequencies_, 0.0f);
   detection_sums_.setZero(num_frequencies_);
   batch_real_.assign(16 * num_chunks_, 0.0f);
   batch_powers_.assign(8 * num_frequencies_, 0.0f);
@@ -423,16 +369,11 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
                 (2 * i + 1 != num_frequencies_ || v == std::complex<float>(1.0f, 0.0f));
     }
   }
-  phasors_real_.assign(static_cast<size_t>(num_chunks_) * padded_frequencies_, 0.0f);
-  phasors_imaginary_.assign(phasors_real_.size(), 0.0f);
-  for (int c = 0; c < num_chunks_; ++c) {
-    for (int i = 0; i < num_frequencies_; ++i) {
-      phasors_real_[c * padded_frequencies_ + i] = phasor_matrix_(i, c).real();
-      phasors_imaginary_[c * padded_frequencies_ + i] = phasor_matrix_(i, c).imag();
-    }
-  }
   for (FrameWindow* window : {&real_window_, &imaginary_window_}) {
-    window->samples.assign(2 * frame_size_ - 1, 0.0f);
+    // Seven more samples than are ever filled: a batch of eight frames
+    // of which only the first are complete reads past the last one.
+    window->capacity = 2 * frame_size_ - 1;
+    window->samples.assign(window->capacity + 7, 0.0f);
     window->frame_size = frame_size_;
   }
   Reset();
@@ -469,61 +410,51 @@ void AcquisitionScorer::ScoreSamples(std::span<const float> baseband_real_signal
     real_window_.Fill(baseband_real_signal.subspan(consumed));
     consumed += imaginary_window_.Fill(baseband_imaginary_signal.subspan(consumed));
     while (real_window_.HasFrame() && imaginary_window_.HasFrame()) {
+      // Sixteen or eight frames in one pass, the last batch possibly partly
+      // complete (its extra lanes are dropped): every frame takes the same
+      // arithmetic, so scores do not depend on how blocks were split.
+      // Advancing may compact the windows, but every sample the batch needs
+      // has been read by then.
       const int available =
           std::min(real_window_.write, imaginary_window_.write) - real_window_.read -
           frame_size_ + 1;
-      if (available >= 8) {
-        // Sixteen (or eight) frames in one pass; advancing may compact the
-        // windows, but every sample the batch needs has been read by then.
-        const int batch = available >= 16 ? 16 : 8;
-        if (batch == 16) {
-          CorrelateChunks16(code_.data(), real_window_.Frame().data(),
-                            imaginary_window_.Frame().data(), num_chunks_, chunk_size_,
-                            last_chunk_size_, batch_real_.data(), batch_imaginary_.data());
-        } else {
-          CorrelateChunks8(code_.data(), real_window_.Frame().data(),
-                           imaginary_window_.Frame().data(), num_chunks_, chunk_size_,
-                           last_chunk_size_, batch_real_.data(), batch_imaginary_.data());
-        }
-        for (int half = 0; half < batch / 8; ++half) {
-          const float* corr_real = batch_real_.data() + 8 * num_chunks_ * half;
-          const float* corr_imaginary = batch_imaginary_.data() + 8 * num_chunks_ * half;
-          if (paired_) {
-            PairedFrequencyPowers8(matrix_real_.data(), matrix_imaginary_.data(), corr_real,
-                                   corr_imaginary, num_frequencies_ / 2,
-                                   num_frequencies_ % 2 == 1, num_chunks_, batch_powers_.data());
-          } else {
-            FrequencyPowers8(matrix_real_.data(), matrix_imaginary_.data(), corr_real,
-                             corr_imaginary, num_frequencies_, num_chunks_,
-                             batch_powers_.data());
-          }
-          FinishFrames8(batch_powers_.data(), acquisition_scores);
-          for (int j = 0; j < 8; ++j) {
-            real_window_.Advance();
-            imaginary_window_.Advance();
-          }
-        }
-        continue;
+      const int batch = available >= 16 ? 16 : 8;
+      if (batch == 16) {
+        CorrelateChunks16(code_.data(), real_window_.Frame().data(),
+                          imaginary_window_.Frame().data(), num_chunks_, chunk_size_,
+                          last_chunk_size_, batch_real_.data(), batch_imaginary_.data());
+      } else {
+        CorrelateChunks8(code_.data(), real_window_.Frame().data(),
+                         imaginary_window_.Frame().data(), num_chunks_, chunk_size_,
+                         last_chunk_size_, batch_real_.data(), batch_imaginary_.data());
       }
-      const float score = ScoreFrame(real_window_.Frame(), imaginary_window_.Frame());
-      if (frame_counter_ - first_frame_ > noise_delay_) acquisition_scores->push_back(score);
-      real_window_.Advance();
-      imaginary_window_.Advance();
+      for (int half = 0; half < batch / 8; ++half) {
+        const float* corr_real = batch_real_.data() + 8 * num_chunks_ * half;
+        const float* corr_imaginary = batch_imaginary_.data() + 8 * num_chunks_ * half;
+        if (paired_) {
+          PairedFrequencyPowers8(matrix_real_.data(), matrix_imaginary_.data(), corr_real,
+                                 corr_imaginary, num_frequencies_ / 2,
+                                 num_frequencies_ % 2 == 1, num_chunks_, batch_powers_.data());
+        } else {
+          FrequencyPowers8(matrix_real_.data(), matrix_imaginary_.data(), corr_real,
+                           corr_imaginary, num_frequencies_, num_chunks_, batch_powers_.data());
+        }
+        const int complete = std::min(8, available - 8 * half);
+        if (complete == 8) {
+          FinishFrames8(batch_powers_.data(), acquisition_scores);
+        } else {
+          for (int j = 0; j < complete; ++j) {
+            const float score = FinishFrame(batch_powers_.data() + j, 8);
+            if (frame_counter_ - first_frame_ > noise_delay_) acquisition_scores->push_back(score);
+          }
+        }
+        for (int j = 0; j < complete; ++j) {
+          real_window_.Advance();
+          imaginary_window_.Advance();
+        }
+      }
     }
   } while (consumed < total);
-}
-
-float AcquisitionScorer::ScoreFrame(std::span<const float> baseband_frame_real,
-                                    std::span<const float> baseband_frame_imaginary) {
-  CHECK_EQ(baseband_frame_real.size(), frame_size_);
-  CHECK_EQ(baseband_frame_imaginary.size(), frame_size_);
-  CorrelateChunks(code_.data(), baseband_frame_real.data(), baseband_frame_imaginary.data(),
-                  num_chunks_, chunk_size_, last_chunk_size_, correlations_real_.data(),
-                  correlations_imaginary_.data());
-  FrequencyPowers(phasors_real_.data(), phasors_imaginary_.data(), correlations_real_.data(),
-                  correlations_imaginary_.data(), num_chunks_, padded_frequencies_,
-                  powers_.data());
-  return FinishFrame(powers_.data(), 1);
 }
 
 float AcquisitionScorer::FinishFrame(const float* powers, int stride) {

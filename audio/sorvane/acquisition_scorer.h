@@ -43,7 +43,8 @@ class AcquisitionScorer {
                     AcquisitionPath path = AcquisitionPath::kFast);
 
   // Consumes equal-length real and imaginary baseband blocks and replaces
-  // `acquisition_scores` with the scores that became available.
+  // `acquisition_scores` with the scores that became available: the same
+  // bits however the stream is split into blocks.
   void ScoreSamples(std::span<const float> baseband_real_signal,
                     std::span<const float> baseband_imaginary_signal,
                     std::vector<float>* acquisition_scores);
@@ -71,11 +72,12 @@ class AcquisitionScorer {
   bool paired() const { return paired_; }
 
  private:
-  // A sliding window over one baseband stream that holds up to 2F - 1
-  // samples and compacts itself once per F frames.
+  // A sliding window over one baseband stream that holds up to capacity =
+  // 2F - 1 samples and compacts itself once per F frames.
   struct FrameWindow {
     std::vector<float> samples;
     int frame_size = 0;
+    int capacity = 0;
     int shifted = 0;
     int read = 0;
     int write = 0;
@@ -89,10 +91,6 @@ class AcquisitionScorer {
     void Clear() { shifted = read = write = 0; }
   };
 
-  // Scores the frame at the windows' read positions; returns the score of
-  // frame frame_counter_ - N.
-  float ScoreFrame(std::span<const float> baseband_frame_real,
-                   std::span<const float> baseband_frame_imaginary);
   // Stores the frequency powers (num_frequencies_ values `stride` apart) of
   // frame frame_counter_ in the history and returns the score of frame
   // counter - N.
@@ -120,16 +118,7 @@ class AcquisitionScorer {
   int64_t first_frame_ = 0;
   FrameWindow real_window_;
   FrameWindow imaginary_window_;
-  // The chunk correlations and the phasor matrix split into real and
-  // imaginary parts; the phasors stored by chunk, frequencies padded to a
-  // multiple of 8 for the vector loops.
-  int padded_frequencies_ = 0;
   bool paired_ = false;
-  std::vector<float> correlations_real_;
-  std::vector<float> correlations_imaginary_;
-  std::vector<float> phasors_real_;  // num_chunks_ rows of padded_frequencies_
-  std::vector<float> phasors_imaginary_;
-  std::vector<float> powers_;        // padded_frequencies_ scratch
   mutable audio_dsp::FloatVector detection_sums_;  // DetectionScore's scratch
   std::vector<float> batch_real_;    // 16 frames' correlations per chunk
   std::vector<float> batch_imaginary_;
