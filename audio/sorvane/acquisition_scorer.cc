@@ -39,37 +39,13 @@ using audio_dsp::Float8;
 #define SORVEL_SPLAT8(x) audio_dsp::Splat8(x)
 #define SORVEL_MAX8(a, b) audio_dsp::Max8((a), (b))
 #endif
-#define SORVEL_SUM8(v) (((v)[0] + (v)[1]) + ((v)[2] + (v)[3]) + (((v)[4] + (v)[5]) + ((v)[6] + (v)[7])))
 
-// The re/im correlation of each chunk of `code` with eight consecutive
-// frames: lane j of each sum is the
-// frame starting j samples later. Broadcasting the template value needs no
-// horizontal sums, which dominate the one-frame version.
-SORVEL_MULTIVERSION void CorrelateChunks8(const float* code, const float* frame_real,
-                                          const float* frame_imaginary, int num_chunks,
-                                          int chunk_size, int last_chunk_size,
-                                          float* out_real, float* out_imaginary) {
-  for (int c = 0; c < num_chunks; ++c) {
-    const int offset = c * chunk_size;
-    const int size = c + 1 < num_chunks ? chunk_size : last_chunk_size;
-    const float* t = code + offset;
-    const float* re = frame_real + offset;
-    const float* im = frame_imaginary + offset;
-    Float8 sum_re = {}, sum_im = {};
-    for (int k = 0; k < size; ++k) {
-      SORVEL_LOAD8(rv, re + k);
-      SORVEL_LOAD8(iv, im + k);
-      sum_re += SORVEL_SPLAT8(t[k]) * rv;
-      sum_im += SORVEL_SPLAT8(t[k]) * iv;
-    }
-    SORVEL_STORE8(out_real + 8 * c, sum_re);
-    SORVEL_STORE8(out_imaginary + 8 * c, sum_im);
-  }
-}
-
-// The same for sixteen consecutive frames: two eight-lane sums per part
-// share each template value and keep more multiply-adds in flight. Frames
-// 0-7 go to out[8 c + j], frames 8-15 to out[8 (num_chunks + c) + j].
+// The re/im correlation of each chunk of `code` with sixteen consecutive
+// frames: lane j of a sum is the frame starting j samples later, so the
+// template value is broadcast and no horizontal sums are needed. Two
+// eight-lane sums per part share each template value and keep more
+// multiply-adds in flight. Frames 0-7 go to out[8 c + j], frames 8-15 to
+// out[8 (num_chunks + c) + j].
 SORVEL_MULTIVERSION void CorrelateChunks16(const float* code, const float* frame_real,
                                            const float* frame_imaginary, int num_chunks,
                                            int chunk_size, int last_chunk_size,
@@ -370,10 +346,10 @@ AcquisitionScorer::AcquisitionScorer(std::span<const float> code_template,
     }
   }
   for (FrameWindow* window : {&real_window_, &imaginary_window_}) {
-    // Seven more samples than are ever filled: a batch of eight frames
+    // Fifteen more samples than are ever filled: a batch of sixteen frames
     // of which only the first are complete reads past the last one.
     window->capacity = 2 * frame_size_ - 1;
-    window->samples.assign(window->capacity + 7, 0.0f);
+    window->samples.assign(window->capacity + 15, 0.0f);
     window->frame_size = frame_size_;
   }
   Reset();
@@ -410,25 +386,18 @@ void AcquisitionScorer::ScoreSamples(std::span<const float> baseband_real_signal
     real_window_.Fill(baseband_real_signal.subspan(consumed));
     consumed += imaginary_window_.Fill(baseband_imaginary_signal.subspan(consumed));
     while (real_window_.HasFrame() && imaginary_window_.HasFrame()) {
-      // Sixteen or eight frames in one pass, the last batch possibly partly
-      // complete (its extra lanes are dropped): every frame takes the same
+      // Sixteen frames in one pass, the last batch possibly partly complete
+      // (its extra lanes are dropped): every frame takes the same
       // arithmetic, so scores do not depend on how blocks were split.
       // Advancing may compact the windows, but every sample the batch needs
       // has been read by then.
       const int available =
           std::min(real_window_.write, imaginary_window_.write) - real_window_.read -
           frame_size_ + 1;
-      const int batch = available >= 16 ? 16 : 8;
-      if (batch == 16) {
-        CorrelateChunks16(code_.data(), real_window_.Frame().data(),
-                          imaginary_window_.Frame().data(), num_chunks_, chunk_size_,
-                          last_chunk_size_, batch_real_.data(), batch_imaginary_.data());
-      } else {
-        CorrelateChunks8(code_.data(), real_window_.Frame().data(),
-                         imaginary_window_.Frame().data(), num_chunks_, chunk_size_,
-                         last_chunk_size_, batch_real_.data(), batch_imaginary_.data());
-      }
-      for (int half = 0; half < batch / 8; ++half) {
+      CorrelateChunks16(code_.data(), real_window_.Frame().data(),
+                        imaginary_window_.Frame().data(), num_chunks_, chunk_size_,
+                        last_chunk_size_, batch_real_.data(), batch_imaginary_.data());
+      for (int half = 0; half < 2 && available > 8 * half; ++half) {
         const float* corr_real = batch_real_.data() + 8 * num_chunks_ * half;
         const float* corr_imaginary = batch_imaginary_.data() + 8 * num_chunks_ * half;
         if (paired_) {
