@@ -218,22 +218,20 @@ SORVEL_MULTIVERSION void Deinterleave8(const float* powers, int n, float* const*
     SORVEL_LOAD8(r6, p + 48);
     SORVEL_LOAD8(r7, p + 56);
     // Pairs of rows interleaved, then pairs of pairs, then the halves.
-#define SORVEL_LOW(a, b) __builtin_shufflevector(a, b, 0, 8, 1, 9, 4, 12, 5, 13)
-#define SORVEL_HIGH(a, b) __builtin_shufflevector(a, b, 2, 10, 3, 11, 6, 14, 7, 15)
-    const Float8 t0 = SORVEL_LOW(r0, r1), t1 = SORVEL_HIGH(r0, r1);
-    const Float8 t2 = SORVEL_LOW(r2, r3), t3 = SORVEL_HIGH(r2, r3);
-    const Float8 t4 = SORVEL_LOW(r4, r5), t5 = SORVEL_HIGH(r4, r5);
-    const Float8 t6 = SORVEL_LOW(r6, r7), t7 = SORVEL_HIGH(r6, r7);
-#undef SORVEL_LOW
-#undef SORVEL_HIGH
-#define SORVEL_LOW(a, b) __builtin_shufflevector(a, b, 0, 1, 8, 9, 4, 5, 12, 13)
-#define SORVEL_HIGH(a, b) __builtin_shufflevector(a, b, 2, 3, 10, 11, 6, 7, 14, 15)
-    const Float8 u0 = SORVEL_LOW(t0, t2), u1 = SORVEL_HIGH(t0, t2);
-    const Float8 u2 = SORVEL_LOW(t1, t3), u3 = SORVEL_HIGH(t1, t3);
-    const Float8 u4 = SORVEL_LOW(t4, t6), u5 = SORVEL_HIGH(t4, t6);
-    const Float8 u6 = SORVEL_LOW(t5, t7), u7 = SORVEL_HIGH(t5, t7);
-#undef SORVEL_LOW
-#undef SORVEL_HIGH
+#define SORVEL_LOW1(a, b) __builtin_shufflevector(a, b, 0, 8, 1, 9, 4, 12, 5, 13)
+#define SORVEL_HIGH1(a, b) __builtin_shufflevector(a, b, 2, 10, 3, 11, 6, 14, 7, 15)
+#define SORVEL_LOW2(a, b) __builtin_shufflevector(a, b, 0, 1, 8, 9, 4, 5, 12, 13)
+#define SORVEL_HIGH2(a, b) __builtin_shufflevector(a, b, 2, 3, 10, 11, 6, 7, 14, 15)
+    const Float8 t0 = SORVEL_LOW1(r0, r1), t1 = SORVEL_HIGH1(r0, r1), t2 = SORVEL_LOW1(r2, r3),
+                 t3 = SORVEL_HIGH1(r2, r3), t4 = SORVEL_LOW1(r4, r5), t5 = SORVEL_HIGH1(r4, r5),
+                 t6 = SORVEL_LOW1(r6, r7), t7 = SORVEL_HIGH1(r6, r7);
+    const Float8 u0 = SORVEL_LOW2(t0, t2), u1 = SORVEL_HIGH2(t0, t2), u2 = SORVEL_LOW2(t1, t3),
+                 u3 = SORVEL_HIGH2(t1, t3), u4 = SORVEL_LOW2(t4, t6), u5 = SORVEL_HIGH2(t4, t6),
+                 u6 = SORVEL_LOW2(t5, t7), u7 = SORVEL_HIGH2(t5, t7);
+#undef SORVEL_LOW1
+#undef SORVEL_HIGH1
+#undef SORVEL_LOW2
+#undef SORVEL_HIGH2
 #define SORVEL_HALVES(j, a, b)                                                            \
   {                                                                                       \
     const Float8 low = __builtin_shufflevector(a, b, 0, 1, 2, 3, 8, 9, 10, 11);          \
