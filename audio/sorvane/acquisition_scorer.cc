@@ -110,14 +110,17 @@ SORVEL_MULTIVERSION void PairedFrequencyPowers8(const float* cosines, const floa
                                                 const float* corr_imaginary, int num_pairs,
                                                 bool has_zero, int num_chunks, float* out) {
   const int n = 2 * num_pairs + (has_zero ? 1 : 0);
-  const auto store = [&](int p, Float8 ar, Float8 ai, Float8 br, Float8 bi) {
-    const Float8 plus_re = ar - bi, plus_im = ai + br;
-    const Float8 minus_re = ar + bi, minus_im = ai - br;
-    const Float8 plus = plus_re * plus_re + plus_im * plus_im;
-    const Float8 minus = minus_re * minus_re + minus_im * minus_im;
-    SORVEL_STORE8(out + 8 * p, plus);
-    SORVEL_STORE8(out + 8 * (n - 1 - p), minus);
-  };
+  // Both powers of pair p from its sums (a macro: a function taking 32-byte
+  // vectors would change the calling convention outside AVX code).
+#define SORVEL_STORE_PAIR(p, ar, ai, br, bi)                                      \
+  {                                                                             \
+    const Float8 plus_re = (ar) - (bi), plus_im = (ai) + (br);                  \
+    const Float8 minus_re = (ar) + (bi), minus_im = (ai) - (br);                \
+    const Float8 plus = plus_re * plus_re + plus_im * plus_im;                  \
+    const Float8 minus = minus_re * minus_re + minus_im * minus_im;             \
+    SORVEL_STORE8(out + 8 * (p), plus);                                         \
+    SORVEL_STORE8(out + 8 * (n - 1 - (p)), minus);                              \
+  }
   int p = 0;
   // Two pairs per pass: eight independent sums hide the multiply-add
   // latency, and each correlation loaded serves both.
@@ -139,8 +142,8 @@ SORVEL_MULTIVERSION void PairedFrequencyPowers8(const float* cosines, const floa
       dr += sw * x;
       di += sw * y;
     }
-    store(p, ar, ai, br, bi);
-    store(p + 1, cr, ci, dr, di);
+    SORVEL_STORE_PAIR(p, ar, ai, br, bi)
+    SORVEL_STORE_PAIR(p + 1, cr, ci, dr, di)
   }
   for (; p < num_pairs; ++p) {
     const float* cs = cosines + p * num_chunks;
@@ -155,8 +158,9 @@ SORVEL_MULTIVERSION void PairedFrequencyPowers8(const float* cosines, const floa
       br += sv * x;
       bi += sv * y;
     }
-    store(p, ar, ai, br, bi);
+    SORVEL_STORE_PAIR(p, ar, ai, br, bi)
   }
+#undef SORVEL_STORE_PAIR
   if (has_zero) {
     Float8 re = {}, im = {};
     for (int c = 0; c < num_chunks; ++c) {
