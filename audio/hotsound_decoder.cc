@@ -31,10 +31,10 @@ void HotsoundDecoder::FeedDsss(const int16_t* samples, int count) {
 
 void HotsoundDecoder::ProcessSamples(const int16_t* samples, int count) {
   if (count <= 0) return;
-  block_.assign(samples, samples + count);  // the detector decimates in place
+  const std::span<const int16_t> block(samples, static_cast<size_t>(count));
   if (state_ == 1) {
     FeedDsss(samples, count);
-    hotsound_detector_->Process(block_);
+    hotsound_detector_->Process(block);
     return;
   }
   // Keep the newest audio: the block's first `take` samples behind as much
@@ -53,7 +53,7 @@ void HotsoundDecoder::ProcessSamples(const int16_t* samples, int count) {
   std::copy(samples, samples + take, pre_trigger_.begin() + pre_trigger_start_ + keep);
   pre_trigger_count_ = keep + take;
 
-  const float score = hotsound_detector_->Process(block_);
+  const float score = hotsound_detector_->Process(block);
   if (!hotsound_detector_->Detected(score)) return;
   VLOG(1) << "Hotsound detected, score " << score;
   state_ = 1;

@@ -67,7 +67,6 @@ class HotsoundDecoder {
   int token_length_bytes_ = 0;
   std::chrono::steady_clock::time_point last_activity_;
   Clock clock_;
-  std::vector<int16_t> block_;
   std::vector<float> floats_;
 };
 

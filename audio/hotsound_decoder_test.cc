@@ -31,13 +31,13 @@ std::vector<int16_t> ToPcm(const std::vector<float>& x) {
 
 // Seconds until the detector first fires on `audio`, fed in 10 ms blocks;
 // negative if it never does. `peak` receives the highest score.
-double SecondsToTrigger(std::vector<int16_t> audio, float* peak = nullptr, int rate = 44100) {
+double SecondsToTrigger(const std::vector<int16_t>& audio, float* peak = nullptr, int rate = 44100) {
   auto detector = MakeHotsoundDetector(rate, 1);
   double fired = -1.0;
   float top = 0.0f;
   for (size_t start = 0; start < audio.size(); start += rate / 100) {
     const size_t n = std::min<size_t>(rate / 100, audio.size() - start);
-    const float score = detector->Process(std::span<int16_t>(audio).subspan(start, n));
+    const float score = detector->Process(std::span<const int16_t>(audio).subspan(start, n));
     top = std::max(top, score);
     if (fired < 0 && detector->Detected(score)) fired = (start + n) / double(rate);
   }
@@ -198,12 +198,32 @@ TEST(HotsoundDetectorTest, WideAndNarrowStepsAgree) {
   EXPECT_TRUE(narrow->Detected(top));
 }
 
-TEST(HotsoundDetectorTest, StepAveragesPairs) {
-  auto detector = MakeHotsoundDetector(44100, 2);
-  std::vector<int16_t> block = {10, 20, -3, -4, 7, 8, 100, -101};
-  detector->Process(block);
-  EXPECT_EQ(std::vector<int16_t>(block.begin(), block.begin() + 4),
-            (std::vector<int16_t>{15, -3, 7, 0}));
+// With a step of two the detector hears interleaved stereo as the pair
+// averages (truncated toward zero), in blocks of any length, and leaves the
+// blocks as they were.
+TEST(HotsoundDetectorTest, StepHearsPairAverages) {
+  const std::vector<int16_t> left =
+      ToPcm(Broadcast(1.5, -6.0, sorvel_sim::NoiseKind::kWhite, 0.0, 0.5));
+  const std::vector<int16_t> right =
+      ToPcm(Broadcast(1.5, -6.0, sorvel_sim::NoiseKind::kPink, 0.0, 0.5, 2));
+  const size_t frames = std::min(left.size(), right.size());
+  std::vector<int16_t> stereo, mono;
+  for (size_t i = 0; i < frames; ++i) {
+    stereo.insert(stereo.end(), {left[i], right[i]});
+    mono.push_back(static_cast<int16_t>((left[i] + right[i]) / 2));
+  }
+  const std::vector<int16_t> original = stereo;
+  auto reference = MakeHotsoundDetector(44100, 1);
+  for (size_t start = 0; start < mono.size(); start += 441) {
+    reference->Process(std::span<const int16_t>(mono).subspan(start, std::min<size_t>(441, mono.size() - start)));
+  }
+  ASSERT_TRUE(reference->Detected(reference->score()));
+  auto paired = MakeHotsoundDetector(44100, 2);
+  for (size_t start = 0; start < stereo.size(); start += 882) {
+    paired->Process(std::span<const int16_t>(stereo).subspan(start, std::min<size_t>(882, stereo.size() - start)));
+  }
+  EXPECT_EQ(paired->score(), reference->score());
+  EXPECT_EQ(stereo, original);
 }
 
 // The carrier and its band must fit below half the rate.

@@ -327,29 +327,34 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
   pooled_.resize(kN);
 }
 
-float HotsoundDetector::Process(std::span<int16_t> samples) {
-  size_t n = samples.size();
-  if (step_ >= 2) {
-    // Pair averages at every step-th sample; the last pair of a block whose
-    // length - 1 is a multiple of the step reads the last sample twice.
-    size_t out = 0;
-    for (size_t i = 0; i < n; i += step_) {
-      const int next = i + 1 < n ? samples[i + 1] : samples[i];
-      samples[out++] = static_cast<int16_t>((samples[i] + next) / 2);
-    }
-    n = out;
-  }
+float HotsoundDetector::Process(std::span<const int16_t> samples) {
+  // With a step of two or more the detector hears pair averages at every
+  // step-th sample (the last pair of a block whose length - 1 is a multiple
+  // of the step reads the last sample twice). Only the samples that land in
+  // a window are formed: most of the stream falls between windows.
+  const size_t n = samples.size();
+  const size_t step = static_cast<size_t>(step_);
+  const size_t count = (n + step - 1) / step;
   float best = -1.0f;
   size_t i = 0;
-  while (i < n) {
+  while (i < count) {
     if (skip_ > 0) {
-      const size_t dropped = std::min<size_t>(skip_, n - i);
+      const size_t dropped = std::min<size_t>(skip_, count - i);
       skip_ -= static_cast<int>(dropped);
       i += dropped;
       continue;
     }
-    const size_t take = std::min<size_t>(window_size_ - fill_, n - i);
-    std::copy(samples.begin() + i, samples.begin() + i + take, window_.begin() + fill_);
+    const size_t take = std::min<size_t>(window_size_ - fill_, count - i);
+    float* out = window_.data() + fill_;
+    if (step == 1) {
+      std::copy(samples.begin() + i, samples.begin() + i + take, out);
+    } else {
+      for (size_t j = 0; j < take; ++j) {
+        const size_t at = (i + j) * step;
+        const int next = at + 1 < n ? samples[at + 1] : samples[at];
+        out[j] = static_cast<float>(static_cast<int16_t>((samples[at] + next) / 2));
+      }
+    }
     fill_ += static_cast<int>(take);
     i += take;
     if (fill_ == window_size_) {

@@ -74,11 +74,11 @@ class HotsoundDetector {
   // Whether a detector of the carrier `frequency` can run at `sample_rate`.
   static bool RateFits(double sample_rate, double frequency);
 
-  // Decimates the block in place by the step (pair averages, which mix
-  // interleaved stereo down to mono) and scores the windows it completes.
-  // Returns the highest score of those windows, or the current score if
-  // the block completed none.
-  float Process(std::span<int16_t> samples);
+  // Decimates the block by the step (pair averages, which mix interleaved
+  // stereo down to mono) and scores the windows it completes. The block is
+  // read, not changed. Returns the highest score of those windows, or the
+  // current score if the block completed none.
+  float Process(std::span<const int16_t> samples);
   bool Detected(float score) const { return score > kThreshold; }
 
   // Picks the track steps of eight lags (x86 with AVX2 and FMA) or of four;

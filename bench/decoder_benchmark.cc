@@ -92,15 +92,14 @@ BENCHMARK(BM_AcquisitionScorer)->Arg(0)->Arg(1)->Unit(benchmark::kMillisecond);
 // audio second, i.e. a real-time factor above ~33 times the decoder's.
 void BM_HotsoundDetectorRealTime(benchmark::State& state) {
   const std::vector<float> signal = ReceivedBroadcast(10.0, -10.0);
-  std::vector<int16_t> pcm(signal.size()), block;
+  std::vector<int16_t> pcm(signal.size());
   for (size_t i = 0; i < signal.size(); ++i) {
     pcm[i] = static_cast<int16_t>(std::clamp(signal[i], -32768.0f, 32767.0f));
   }
   auto detector = audio_sorvane::MakeHotsoundDetector(44100, 1);
   for (auto _ : state) {
     for (size_t start = 0; start + 441 <= pcm.size(); start += 441) {
-      block.assign(pcm.begin() + start, pcm.begin() + start + 441);
-      benchmark::DoNotOptimize(detector->Process(block));
+      benchmark::DoNotOptimize(detector->Process(std::span<const int16_t>(pcm).subspan(start, 441)));
     }
   }
   state.SetItemsProcessed(state.iterations() * static_cast<int64_t>(signal.size()));
