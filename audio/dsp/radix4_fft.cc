@@ -220,9 +220,15 @@ Radix4Fft::Radix4Fft(int size) : size_(size) {
   // Stage with sub-transforms of length ns (4, 16, ... size / 4): butterfly
   // j multiplies its inputs r = 1..3 by exp(-2 pi i r k / (4 ns)),
   // k = j mod ns; grouped by four lanes, and by eight for the wide path.
-  twiddles_ = StageTwiddles(size, 4);
-  if (size >= 64) wide_twiddles_ = StageTwiddles(size, 8);
-  wide_ = !wide_twiddles_.empty() && HasWidePaths();
+  // Only the table of the path in use is built (a second one is made if a
+  // caller switches paths): at the lengths of a lag profile each is tens of
+  // kilobytes.
+  wide_ = size >= 64 && HasWidePaths();
+  if (wide_) {
+    wide_twiddles_ = StageTwiddles(size, 8);
+  } else {
+    twiddles_ = StageTwiddles(size, 4);
+  }
   a_re_.resize(size);
   a_im_.resize(size);
   b_re_.resize(size);
@@ -230,7 +236,9 @@ Radix4Fft::Radix4Fft(int size) : size_(size) {
 }
 
 bool Radix4Fft::UseWide(bool wide) {
-  if (wide && (wide_twiddles_.empty() || !HasWidePaths())) return false;
+  if (wide && (size_ < 64 || !HasWidePaths())) return false;
+  std::vector<float>& table = wide ? wide_twiddles_ : twiddles_;
+  if (table.empty()) table = StageTwiddles(size_, wide ? 8 : 4);
   wide_ = wide;
   return true;
 }

@@ -38,9 +38,10 @@ class Radix4Fft {
  private:
   int size_;
   // Per stage after the first, per group of four butterflies: the twiddles
-  // w^1, w^2, w^3, real and imaginary, four lanes each.
+  // w^1, w^2, w^3, real and imaginary, four lanes each; built when the
+  // four-lane path is used.
   std::vector<float> twiddles_;
-  std::vector<float> wide_twiddles_;  // the same per group of eight
+  std::vector<float> wide_twiddles_;  // the same per group of eight, for the wide path
   bool wide_ = false;
   std::vector<float> a_re_, a_im_, b_re_, b_im_;
 };

@@ -180,8 +180,11 @@ void MultipathScorer::ReserveFrames(int count) {
     one[0].scores.setZero(tones_.rows());
     spare_frames_.push_back(one.extract(one.begin()));
   }
-  // Profiles only for sounded frames.
-  while (static_cast<int>(profile_pool_.size()) < count / kSoundingInterval + 1) {
+  // Profiles for the sounded frames of one channel estimate and a few more:
+  // a frame's profile is given back once no later frame's estimate reads
+  // it, so only a handful are held at a time. The pool keeps any it grows.
+  const int profiles = std::min(count, params_.channel_frames + 4);
+  while (static_cast<int>(profile_pool_.size()) < profiles) {
     profile_pool_.emplace_back().reserve(lags_);
   }
 }
@@ -226,21 +229,15 @@ void MultipathScorer::Derotate(const BasebandView& view, int64_t start) {
   }
 }
 
-void MultipathScorer::Transform(const BasebandView& view, int64_t start, bool keep_window,
-                                Frame* frame) {
-  const int n = fft_.GetSize();
+void MultipathScorer::WindowSpectrum(const BasebandView& view, int64_t start) {
   Derotate(view, start);
   std::fill(buffer_.begin() + window_, buffer_.end(), std::complex<float>());
-  if (keep_window) {
-    Borrow(&window_pool_, &frame->window);
-    frame->window.assign(buffer_.begin(), buffer_.begin() + window_);
-  }
   fft_.Forward(buffer_.data(), spectrum_.data());
-  if (keep_window) {
-    Borrow(&spectrum_pool_, &frame->spectrum);
-    frame->spectrum.assign(spectrum_.begin(), spectrum_.end());
-  }
-  Multiply(spectrum_.data(), code_spectrum_.data(), n, false);
+}
+
+void MultipathScorer::Transform(const BasebandView& view, int64_t start, Frame* frame) {
+  WindowSpectrum(view, start);
+  Multiply(spectrum_.data(), code_spectrum_.data(), fft_.GetSize(), false);
   fft_.Inverse(spectrum_.data(), buffer_.data());
   Borrow(&profile_pool_, &frame->profile);
   frame->profile.assign(buffer_.begin(), buffer_.begin() + lags_);
@@ -252,14 +249,14 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
   // Powers summed over frames (their phases are not trusted at low SNR),
   // then the sum of squares, which rewards energy gathered into peaks over
   // energy smeared across lags by a wrong offset.
-  const auto peakiness = [&]() {
+  const auto peakiness = [&](const double* power) {
     double sum = 0.0;
-    for (double p : power_) sum += p * p;
+    for (int m = 0; m < lags_; ++m) sum += power[m] * power[m];
     return sum;
   };
-  const auto add_power = [&](const std::complex<float>* profile) {
+  const auto add_power = [&](const std::complex<float>* profile, double* power) {
     const float* p = reinterpret_cast<const float*>(profile);
-    for (int m = 0; m < lags_; ++m) power_[m] += p[2 * m] * p[2 * m] + p[2 * m + 1] * p[2 * m + 1];
+    for (int m = 0; m < lags_; ++m) power[m] += p[2 * m] * p[2 * m] + p[2 * m + 1] * p[2 * m + 1];
   };
   float best = 0.0f;
   double best_value = -1.0;
@@ -274,35 +271,31 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
   // window instead of derotating it, so each frame is transformed once. The
   // grid steps by the whole bins nearest to kCoarseStep cycles per frame,
   // where a half-step error still keeps most of the power. Frames are taken
-  // a nominal period apart.
+  // a nominal period apart; each offset's powers are summed in its own row.
   constexpr float kCoarseStep = 0.6f;
   const int n = fft_.GetSize();
   const int stride = std::max(
       1, static_cast<int>(std::lround(kCoarseStep * static_cast<float>(n) / static_cast<float>(frame_size_))));
   const float bin = static_cast<float>(stride * frame_size_) / static_cast<float>(n);
   const int bins = static_cast<int>(std::floor(params_.max_doppler / bin + 0.5f));
-  std::vector<std::vector<std::complex<float>>>& spectra = search_spectra_;
-  spectra.resize(params_.doppler_frames);
-  int frames = 0;
+  search_powers_.assign(static_cast<size_t>(2 * bins + 1) * lags_, 0.0);
   SetRotation(0.0f);
   for (int j = 0; j < params_.doppler_frames; ++j) {
     const int64_t frame_start = start + static_cast<int64_t>(j) * frame_size_;
     if (!HasWindow(view, frame_start)) break;
-    Transform(view, frame_start, true, &search_frame_);
-    spectra[j].swap(search_frame_.spectrum);
-    ++frames;
+    WindowSpectrum(view, frame_start);
+    for (int b = -bins; b <= bins; ++b) {
+      // Derotating by b steps takes bin k + b stride to bin k: a cyclic shift.
+      const auto from = spectrum_.begin() + ((b * stride) % n + n) % n;
+      std::copy(spectrum_.begin(), from, std::copy(from, spectrum_.end(), buffer_.begin()));
+      Multiply(buffer_.data(), code_spectrum_.data(), n, false);
+      fft_.Inverse(buffer_.data(), buffer_.data());
+      add_power(buffer_.data(), &search_powers_[static_cast<size_t>(b + bins) * lags_]);
+    }
   }
   for (int b = -bins; b <= bins; ++b) {
-    std::fill(power_.begin(), power_.end(), 0.0);
-    for (int j = 0; j < frames; ++j) {
-      // Derotating by b steps takes bin k + b stride to bin k: a cyclic shift.
-      const auto from = spectra[j].begin() + ((b * stride) % n + n) % n;
-      std::copy(spectra[j].begin(), from, std::copy(from, spectra[j].end(), spectrum_.begin()));
-      Multiply(spectrum_.data(), code_spectrum_.data(), n, false);
-      fft_.Inverse(spectrum_.data(), buffer_.data());
-      add_power(buffer_.data());
-    }
-    consider(std::clamp(b * bin, -params_.max_doppler, params_.max_doppler), peakiness());
+    consider(std::clamp(b * bin, -params_.max_doppler, params_.max_doppler),
+             peakiness(&search_powers_[static_cast<size_t>(b + bins) * lags_]));
   }
 
   // Two refinements around the best, derotated exactly, the frames a
@@ -315,10 +308,10 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
     for (int j = 0; j < params_.doppler_frames; ++j) {
       const int64_t frame_start = start + std::llround(j * period);
       if (!HasWindow(view, frame_start)) break;
-      Transform(view, frame_start, false, &search_frame_);
-      add_power(search_frame_.profile.data());
+      Transform(view, frame_start, &search_frame_);
+      add_power(search_frame_.profile.data(), power_.data());
     }
-    consider(doppler, peakiness());
+    consider(doppler, peakiness(power_.data()));
   };
   best_value = -1.0;
   const float coarse_best = best;
@@ -337,7 +330,7 @@ MultipathScorer::Frame& MultipathScorer::CachedFrame(const BasebandView& view, i
   Frame& frame = FrameAt(k);
   // Only the profile is kept: a neighbour's window is derotated again if it
   // is ever scored itself, so at most one window is held at a time.
-  if (frame.profile.empty()) Transform(view, FrameStart(k), false, &frame);
+  if (frame.profile.empty()) Transform(view, FrameStart(k), &frame);
   return frame;
 }
 

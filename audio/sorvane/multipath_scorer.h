@@ -85,8 +85,9 @@ class MultipathScorer {
   // change with more audio). Frames are cached, so each is scored once.
   bool Score(const BasebandView& view, int64_t k, audio_dsp::FloatVector* scores);
 
-  // Sets aside storage for `count` frames, so that a buffer of that many
-  // frames is scored without allocating.
+  // Sets aside storage for `count` frames (their scores) and the profiles
+  // of a few channel estimates, so that streaming a buffer of that many
+  // frames allocates nothing once warm.
   void ReserveFrames(int count);
 
   // Drops what is cached for frames before grid index k.
@@ -105,10 +106,12 @@ class MultipathScorer {
     bool scored = false;
     audio_dsp::FloatVector scores;
   };
-  // Fills the profile of the frame at `start` (and keeps its window and the
-  // window's spectrum when asked) from the view: the baseband derotated by
-  // the offset of rotation_, correlated with the code.
-  void Transform(const BasebandView& view, int64_t start, bool keep_window, Frame* frame);
+  // spectrum_ = the spectrum of the window of a frame starting at `start`,
+  // derotated by the offset of rotation_ and zero-padded.
+  void WindowSpectrum(const BasebandView& view, int64_t start);
+  // Fills the profile of the frame at `start` from the view: the baseband
+  // derotated by the offset of rotation_, correlated with the code.
+  void Transform(const BasebandView& view, int64_t start, Frame* frame);
   Frame& CachedFrame(const BasebandView& view, int64_t k);
   // The frame at grid index k, added (from a spare node) when absent.
   Frame& FrameAt(int64_t k);
@@ -163,7 +166,7 @@ class MultipathScorer {
   std::vector<std::complex<float>> rotation_;  // exp(-2 pi j doppler i / frame size)
   std::vector<std::pair<const std::complex<float>*, std::complex<float>>> neighbours_;
   Frame search_frame_;
-  std::vector<std::vector<std::complex<float>>> search_spectra_;
+  std::vector<double> search_powers_;  // lag powers per coarse Doppler offset
   audio_dsp::FloatVector real_part_;
 };
 
