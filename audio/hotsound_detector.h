@@ -20,7 +20,8 @@
 // lags) and two lengths: the last kWindows windows (about 0.5 s, for a
 // quick wake) and the last kLongWindows (about 1 s, for weak broadcasts;
 // updated every other window), each against its own threshold; 25.0 means
-// a broadcast.
+// a broadcast. A long track is followed only when the short tracks show
+// that it could come near a wake (see kLongGate).
 //
 // Scores depend only on the audio of the last kLongWindows windows, not on
 // how it was split into blocks. Not thread safe.
@@ -66,6 +67,10 @@ class HotsoundDetector {
   static constexpr int kHopFrames = 3;  // frames from one window to the next
   static constexpr int kWindows = 4;    // windows a score adds up
   static constexpr int kLongWindows = 8;  // ... and the slower, finer one
+  // Long tracks are followed only where they could reach this fraction of
+  // the threshold: scores from kLongGate * kThreshold up are exact, lower
+  // ones may leave the long tracks out.
+  static constexpr float kLongGate = 0.8f;
 
   // Null when the configuration cannot make a detector: a bad rate or hop,
   // or a carrier band that does not fit below half the sample rate.
@@ -102,9 +107,11 @@ class HotsoundDetector {
     std::vector<int> drift;  // per carrier offset: statistics the code moves per window
     // The last kLongWindows windows' statistics, kCarrierOffsets x lags each.
     std::vector<std::vector<float>> ring;
-    // Per window slot, the short track that ended there; the long track's
-    // best sum relative to its threshold when last updated.
+    // Per window slot, the short track that ended there and its best sum;
+    // the long track's best sum relative to its threshold when last updated
+    // (0 when skipped).
     std::vector<std::vector<float>> short_tracks;
+    std::vector<float> short_best;
     float long_score = 0.0f;
   };
 

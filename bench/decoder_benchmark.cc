@@ -108,6 +108,25 @@ void BM_HotsoundDetectorRealTime(benchmark::State& state) {
 }
 BENCHMARK(BM_HotsoundDetectorRealTime)->Unit(benchmark::kMicrosecond);
 
+// The detector alone on quiet room noise (-60 dBFS pink), as it runs for
+// hours between broadcasts.
+void BM_HotsoundDetectorIdle(benchmark::State& state) {
+  const std::vector<float> noise =
+      sorvel_sim::MakeNoise(sorvel_sim::NoiseKind::kPink, 10 * 44100, 33.0, 5);
+  std::vector<int16_t> pcm(noise.size());
+  for (size_t i = 0; i < noise.size(); ++i) {
+    pcm[i] = static_cast<int16_t>(std::clamp(noise[i], -32768.0f, 32767.0f));
+  }
+  auto detector = audio_sorvane::MakeHotsoundDetector(44100, 1);
+  for (auto _ : state) {
+    for (size_t start = 0; start + 441 <= pcm.size(); start += 441) {
+      benchmark::DoNotOptimize(detector->Process(std::span<const int16_t>(pcm).subspan(start, 441)));
+    }
+  }
+  state.counters["x_real_time"] = benchmark::Counter(10.0, benchmark::Counter::kIsIterationInvariantRate);
+}
+BENCHMARK(BM_HotsoundDetectorIdle)->Unit(benchmark::kMicrosecond);
+
 // Heap held by one decoder (construction included) after 60 s of input.
 void BM_DsssDecoderMemory(benchmark::State& state) {
   const std::vector<float> signal = ReceivedBroadcast(10.0, -10.0);
