@@ -66,8 +66,8 @@ std::vector<float> BandLimited(const std::vector<float>& x) {
 }
 
 // Wakes within half a second of the start of broadcasts that the DSSS
-// decoder still decodes: weak ones in white and pink noise, moving phones,
-// a 48 kHz microphone, reverberant rooms at several metres.
+// decoder still decodes: weak ones in white and pink noise, phones moving
+// at any speed up to 1 m/s, a 48 kHz microphone, reverberant rooms at several metres.
 TEST(HotsoundDetectorTest, WakesWithinHalfASecond) {
   using sorvel_sim::NoiseKind;
   const struct {
@@ -80,6 +80,9 @@ TEST(HotsoundDetectorTest, WakesWithinHalfASecond) {
       {"pink -18 dB", -18.0, NoiseKind::kPink, 0.0},
       {"approaching 1 m/s, -12 dB", -12.0, NoiseKind::kWhite, 1.0},
       {"receding 1 m/s, -12 dB", -12.0, NoiseKind::kWhite, -1.0},
+      // Carriers half a bin between whole-bin offsets.
+      {"hand drift 0.2 m/s, -16 dB", -16.0, NoiseKind::kWhite, 0.2},
+      {"walking 0.65 m/s, -16 dB", -16.0, NoiseKind::kWhite, 0.65},
   };
   for (const auto& c : kCases) {
     // One second of noise alone, then the broadcast.

@@ -23,10 +23,12 @@ constexpr double kCutoffHz = 2200.0;
 // Track sums (in units of a window's mean power) that score kThreshold, for
 // single lags. In an hour noise of any kind and level reaches about 26 on
 // the short track and 40 on the long one, speech and music 30 and 41 (the
-// tails fall about e-fold per unit). A broadcast at -16 dB full-band SNR in
-// white noise sums about 55 on the short track at rest, 40 at 1 m/s.
-constexpr float kRawThreshold = 34.0f;
-constexpr float kLongRawThreshold = 46.0f;
+// tails fall about e-fold per unit), with seven carrier offsets; eleven
+// raise the tails by about ln(11 / 7) = 0.45, and the thresholds by half a
+// unit with them. A broadcast at -16 dB full-band SNR in white noise sums
+// about 55 on the short track at rest, 40 at 1 m/s.
+constexpr float kRawThreshold = 34.5f;
+constexpr float kLongRawThreshold = 46.5f;
 // A room spreads the code over its reflections, where no single lag stands
 // out. A second family of tracks adds the powers of kSpreadLags lags (half
 // a frame, 22 ms), evaluated every kSpreadStride lags (a track step may
@@ -51,8 +53,14 @@ constexpr float kSilentPower = 1e-3f;
 constexpr float kMaxCrest = 20.0f;
 // The carrier offsets searched, in window bins, and the largest whole-bin
 // shift they read from a spectrum (-2.5 reads the half-bin spectrum 3 down).
-constexpr double kOffsetBins[HotsoundDetector::kCarrierOffsets] = {-2.5, -2.0, -1.0, 0.0,
-                                                                   1.0,  2.0,  2.5};
+constexpr double kOffsetBins[HotsoundDetector::kCarrierOffsets] = {
+    -2.5, -2.0, -1.5, -1.0, -0.5, 0.0, 0.5, 1.0, 1.5, 2.0, 2.5};
+// The spread family tracks only the whole-bin offsets and the outermost
+// ones: its pooled sums and tracks would add a fifth to the detector's cost
+// at the half-bin offsets too, for phones that move in a reverberant room,
+// where the single lags of the direct path still see them.
+constexpr bool kSpreadOffset[HotsoundDetector::kCarrierOffsets] = {
+    true, true, false, true, false, true, false, true, false, true, true};
 constexpr int kMaxShift = 3;
 // The code's lag moves against the carrier offset (a faster broadcast
 // reaches each window earlier in its code).
@@ -159,11 +167,12 @@ SORVEL_MULTIVERSION float MultiplySpectra(const float* x_re, const float* x_im,
   return audio_dsp::Sum4(total);
 }
 
-// out = |re + i im|^2 over n values (a multiple of four).
-SORVEL_MULTIVERSION void Powers(const float* re, const float* im, int n, float* out) {
+// out = scale |re + i im|^2 over n values (a multiple of four).
+SORVEL_MULTIVERSION void Powers(const float* re, const float* im, int n, float scale, float* out) {
+  const audio_dsp::Float4 gain = audio_dsp::Splat4(scale);
   for (int t = 0; t < n; t += 4) {
     const audio_dsp::Float4 r = audio_dsp::Load4(re + t), i = audio_dsp::Load4(im + t);
-    audio_dsp::Store4(out + t, r * r + i * i);
+    audio_dsp::Store4(out + t, (r * r + i * i) * gain);
   }
 }
 
@@ -174,52 +183,51 @@ void PadRow(int n, float* row) {
   std::copy(row + kPad, row + 2 * kPad, row + n + kPad);
 }
 
-// One track step over n lags (see HotsoundDetector::ExtendTrack).
-audio_dsp::Float4 StepTrack(int n, float* from, float* to, const float* powers,
-                            float scale, int drift) {
+// One track step over n lags (see HotsoundDetector::ExtendTrack); the
+// lane-wise maximum of `to` only when kTop.
+template <bool kTop>
+audio_dsp::Float4 StepTrack(int n, float* from, float* to, const float* powers, int drift) {
   // Each step may move one lag around the drift.
   PadRow(n, from);
   const float* source = from + kPad - drift;
   float* out = to + kPad;
   using audio_dsp::Load4;
-  const audio_dsp::Float4 gain = audio_dsp::Splat4(scale);
   audio_dsp::Float4 top = {};
   for (int t = 0; t < n; t += 4) {
     const audio_dsp::Float4 best =
         Max(Max(Load4(source + t - 1), Load4(source + t)), Load4(source + t + 1));
-    const audio_dsp::Float4 sum = gain * Load4(powers + t) + best;
+    const audio_dsp::Float4 sum = Load4(powers + t) + best;
     audio_dsp::Store4(out + t, sum);
-    top = Max(top, sum);
+    if (kTop) top = Max(top, sum);
   }
   return top;
 }
 
-
 #if defined(SORVEL_WIDE_PATHS)
 // StepTrack eight lags at a time.
+template <bool kTop>
 SORVEL_WIDE audio_dsp::Float4 StepTrackWide(int n, float* from, float* to, const float* powers,
-                                            float scale, int drift) {
+                                            int drift) {
   using audio_dsp::Wide;
   PadRow(n, from);
   const float* source = from + kPad - drift;
   float* out = to + kPad;
-  const Wide gain = Wide{} + scale;
   Wide top = {};
   for (int t = 0; t < n; t += 8) {
     const Wide a = SORVEL_LOAD_WIDE(source + t - 1), b = SORVEL_LOAD_WIDE(source + t);
     const Wide c = SORVEL_LOAD_WIDE(source + t + 1);
     const Wide ab = a > b ? a : b;
     const Wide best = ab > c ? ab : c;
-    const Wide sum = gain * SORVEL_LOAD_WIDE(powers + t) + best;
+    const Wide sum = SORVEL_LOAD_WIDE(powers + t) + best;
     SORVEL_STORE_WIDE(out + t, sum);
-    top = top > sum ? top : sum;
+    if (kTop) top = top > sum ? top : sum;
   }
   return Max(__builtin_shufflevector(top, top, 0, 1, 2, 3), __builtin_shufflevector(top, top, 4, 5, 6, 7));
 }
 #else
-audio_dsp::Float4 StepTrackWide(int n, float* from, float* to, const float* powers, float scale,
-                                int drift) {
-  return StepTrack(n, from, to, powers, scale, drift);
+template <bool kTop>
+audio_dsp::Float4 StepTrackWide(int n, float* from, float* to, const float* powers, int drift) {
+  return StepTrack<kTop>(n, from, to, powers, drift);
 }
 #endif
 
@@ -304,9 +312,10 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
     half_turn_re_.push_back(static_cast<float>(std::cos(std::numbers::pi * m / kN)));
     half_turn_im_.push_back(static_cast<float>(-std::sin(std::numbers::pi * m / kN)));
   }
-  // Products fill the first product_size_ bins; the rest stay zero.
-  prod_re_.assign(kN, 0.0f);
-  prod_im_.assign(kN, 0.0f);
+  // Products fill the first product_size_ bins of each offset's row; the
+  // rest stay zero.
+  prod_re_.assign(kCarrierOffsets * kN, 0.0f);
+  prod_im_.assign(kCarrierOffsets * kN, 0.0f);
   // A phone moving at v compresses the broadcast by v / c: the code's lag
   // moves by the same fraction of a hop per window, and its carrier by the
   // same fraction of the carrier frequency (one bin: window_rate Hz).
@@ -322,17 +331,19 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
   for (Family& f : families_) {
     f.row = f.lags + 2 * kPad;
     for (int d = 0; d < kCarrierOffsets; ++d) {
+      if (&f == &families_[1] && !kSpreadOffset[d]) continue;
+      f.offsets.push_back(d);
       const double compression = kOffsetBins[d] * window_rate / config_.frequency;
       f.drift.push_back(
           static_cast<int>(std::lround(kDriftSign * compression * kHopFrames * kN / f.stride)));
       CHECK(std::abs(f.drift.back()) + 1 <= kPad);
     }
-    f.ring.assign(kLongWindows, std::vector<float>(kCarrierOffsets * f.lags, 0.0f));
-    f.short_tracks.assign(kLongWindows, std::vector<float>(kCarrierOffsets * f.row, 0.0f));
+    const int offsets = static_cast<int>(f.offsets.size());
+    f.ring.assign(kLongWindows, std::vector<float>(offsets * f.row, 0.0f));
+    f.short_tracks.assign(kLongWindows, std::vector<float>(offsets * f.row, 0.0f));
     f.short_best.assign(kLongWindows, 0.0f);
   }
   for (auto* v : {&track_a_, &track_b_, &track_c_}) v->assign(kCarrierOffsets * families_[0].row, 0.0f);
-  scales_.assign(kLongWindows, 0.0f);
   static_assert(kSpreadStride == 4 && kN % 16 == 0 && kSpreadLags % 16 == 0);
   pooled_.resize(kN);
 }
@@ -391,7 +402,6 @@ void HotsoundDetector::ScoreWindow() {
   // Digital silence scores zero, and so does a window that one click
   // dominates: its correlation is the code itself, the same in every window
   // that a regular tick lands in alike.
-  float scale = 0.0f;
   if (energy >= kSilentPower * kN && peak < kMaxCrest * energy / kN) {
     fft_.Forward(base_re_.data(), base_im_.data(), spec_re_.data(), spec_im_.data());
     Condition(spec_re_.data(), spec_im_.data(), whole_re_.data(), whole_im_.data());
@@ -403,10 +413,11 @@ void HotsoundDetector::ScoreWindow() {
     }
     fft_.Forward(base_re_.data(), base_im_.data(), spec_re_.data(), spec_im_.data());
     Condition(spec_re_.data(), spec_im_.data(), half_re_.data(), half_im_.data());
-    // Correlation powers per offset; their total from the products (the
-    // inverse transform is unnormalised: sum |c|^2 = kN sum |product|^2).
-    // The products sit from bin 0 rather than around it: a cyclic shift of
-    // the spectrum turns the lags' phases but not their powers.
+    // The spectrum times the code's per offset, and their total power, which
+    // gives the lags' mean power (the inverse transform is unnormalised:
+    // sum |c|^2 = kN sum |product|^2). The products sit from bin 0 rather
+    // than around it: a cyclic shift of the spectrum turns the lags' phases
+    // but not their powers.
     float total = 0.0f;
     for (int d = 0; d < kCarrierOffsets; ++d) {
       const int shift = static_cast<int>(std::floor(kOffsetBins[d]));
@@ -414,15 +425,24 @@ void HotsoundDetector::ScoreWindow() {
       const float* x_re = (half ? half_re_.data() : whole_re_.data()) + kMaxShift + shift;
       const float* x_im = (half ? half_im_.data() : whole_im_.data()) + kMaxShift + shift;
       total += MultiplySpectra(x_re, x_im, code_re_.data(), code_im_.data(), product_size_,
-                               prod_re_.data(), prod_im_.data());
-      fft_.Inverse(prod_re_.data(), prod_im_.data(), base_re_.data(), base_im_.data());
-      float* powers = families_[0].ring[slot].data() + d * kN;
-      Powers(base_re_.data(), base_im_.data(), kN, powers);
-      PoolSpread(powers, families_[1].ring[slot].data() + d * families_[1].lags);
+                               prod_re_.data() + d * kN, prod_im_.data() + d * kN);
     }
-    scale = kCarrierOffsets / total;
+    // Correlation powers in units of their mean.
+    const float scale = kCarrierOffsets / total;
+    int spread_row = 0;
+    for (int d = 0; d < kCarrierOffsets; ++d) {
+      fft_.Inverse(prod_re_.data() + d * kN, prod_im_.data() + d * kN, base_re_.data(),
+                   base_im_.data());
+      float* powers = families_[0].ring[slot].data() + d * families_[0].row + kPad;
+      Powers(base_re_.data(), base_im_.data(), kN, scale, powers);
+      if (kSpreadOffset[d]) {
+        PoolSpread(powers, families_[1].ring[slot].data() + spread_row * families_[1].row + kPad);
+        ++spread_row;
+      }
+    }
+  } else {
+    for (Family& f : families_) std::fill(f.ring[slot].begin(), f.ring[slot].end(), 0.0f);
   }
-  scales_[slot] = scale;
 
   float best = 0.0f;
   const bool update_long = windows_++ % 2 == 0;
@@ -514,11 +534,12 @@ void HotsoundDetector::Condition(const float* spec_re, const float* spec_im, flo
 }
 
 float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
-  // The short track over the last kWindows windows; the long one extends
-  // the short track that ended kWindows windows ago by the same windows
-  // (on every other window: it is for broadcasts that take a second).
-  // Each step writes the other buffer of a pair; the short track's pair is
-  // arranged so that its last step lands in the slot's track.
+  // The short track over the last kWindows windows starts from the oldest
+  // window's row; the long one extends the short track that ended kWindows
+  // windows ago by the same windows (on every other window: it is for
+  // broadcasts that take a second). Each step writes the other buffer of a
+  // pair; the short track's pair is arranged so that its last step lands in
+  // the slot's track.
   const int first = (newest + kLongWindows - kWindows + 1) % kLongWindows;
   static_assert(kWindows >= 2);
   float* const short_track = f.short_tracks[newest].data();
@@ -526,22 +547,21 @@ float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
   float* const short_rows[2] = {kOddSteps ? track_a_.data() : short_track,
                                 kOddSteps ? short_track : track_a_.data()};
   const int older_slot = (first + kLongWindows - 1) % kLongWindows;
-  for (int d = 0; d < kCarrierOffsets; ++d) {
-    const float* e = f.ring[first].data() + d * f.lags;
-    const float scale = scales_[first];
-    std::transform(e, e + f.lags, short_rows[0] + d * f.row + kPad, [=](float p) { return p * scale; });
-  }
+  const int offsets = static_cast<int>(f.offsets.size());
   // The last step's outputs give each track's best sum.
   audio_dsp::Float4 short_top = {};
   for (int k = 1; k < kWindows; ++k) {
     const int slot = (first + k) % kLongWindows;
     const bool last = k == kWindows - 1;
-    for (int d = 0; d < kCarrierOffsets; ++d) {
-      const float* e = f.ring[slot].data() + d * f.lags;
+    for (int d = 0; d < offsets; ++d) {
       const int row = d * f.row;
-      const audio_dsp::Float4 top = ExtendTrack(f, short_rows[(k - 1) % 2] + row,
-                                                short_rows[k % 2] + row, e, scales_[slot], f.drift[d]);
-      if (last) short_top = Max(short_top, top);
+      float* const from = k == 1 ? f.ring[first].data() + row : short_rows[(k - 1) % 2] + row;
+      const float* e = f.ring[slot].data() + row + kPad;
+      if (last) {
+        short_top = Max(short_top, ExtendTrack<true>(f, from, short_rows[k % 2] + row, e, f.drift[d]));
+      } else {
+        ExtendTrack<false>(f, from, short_rows[k % 2] + row, e, f.drift[d]);
+      }
     }
   }
   f.short_best[newest] = audio_dsp::MaxLane4(short_top);
@@ -555,7 +575,7 @@ float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
   // A long track sums no more than the best of the older short track plus
   // the best of this one (the same windows from a zero start). Where even
   // that stays below kLongGate, the long track cannot decide a wake and its
-  // steps are skipped: in noise they are a third of the detector's work.
+  // steps are skipped: in noise they are a third of the tracks' work.
   if (update_long && long_score(f.short_best[older_slot] + f.short_best[newest]) < kLongGate) {
     f.long_score = 0.0f;
   } else if (update_long) {
@@ -564,13 +584,16 @@ float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
     audio_dsp::Float4 long_top = {};
     for (int k = 0; k < kWindows; ++k) {
       const int slot = (first + k) % kLongWindows;
-      for (int d = 0; d < kCarrierOffsets; ++d) {
-        const float* e = f.ring[slot].data() + d * f.lags;
+      for (int d = 0; d < offsets; ++d) {
         const int row = d * f.row;
         float* const from = k == 0 ? older + row : long_rows[k % 2] + row;
-        const audio_dsp::Float4 top =
-            ExtendTrack(f, from, long_rows[(k + 1) % 2] + row, e, scales_[slot], f.drift[d]);
-        if (k == kWindows - 1) long_top = Max(long_top, top);
+        float* const to = long_rows[(k + 1) % 2] + row;
+        const float* e = f.ring[slot].data() + row + kPad;
+        if (k == kWindows - 1) {
+          long_top = Max(long_top, ExtendTrack<true>(f, from, to, e, f.drift[d]));
+        } else {
+          ExtendTrack<false>(f, from, to, e, f.drift[d]);
+        }
       }
     }
     f.long_score = long_score(audio_dsp::MaxLane4(long_top));
@@ -579,10 +602,11 @@ float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
       (f.short_best[newest] - kWindows * mean) / (f.threshold - kWindows * mean), f.long_score);
 }
 
+template <bool kTop>
 audio_dsp::Float4 HotsoundDetector::ExtendTrack(const Family& f, float* from, float* to,
-                                                const float* powers, float scale, int drift) const {
-  return wide_steps_ ? StepTrackWide(f.lags, from, to, powers, scale, drift)
-                     : StepTrack(f.lags, from, to, powers, scale, drift);
+                                                const float* powers, int drift) const {
+  return wide_steps_ ? StepTrackWide<kTop>(f.lags, from, to, powers, drift)
+                     : StepTrack<kTop>(f.lags, from, to, powers, drift);
 }
 
 bool HotsoundDetector::UseWideSteps(bool wide) {

@@ -16,8 +16,9 @@
 // milliseconds of its reflections. A score adds windows along a lag track
 // (each step may move one lag around the drift that the carrier offset
 // implies, which follows a moving phone) and takes the best track and
-// offset, for two statistics (single lags, and sums over half a frame of
-// lags) and two lengths: the last kWindows windows (about 0.5 s, for a
+// offset, for two statistics (single lags at every offset, and sums over
+// half a frame of lags at the whole-bin and outermost offsets) and two
+// lengths: the last kWindows windows (about 0.5 s, for a
 // quick wake) and the last kLongWindows (about 1 s, for weak broadcasts;
 // updated every other window), each against its own threshold; 25.0 means
 // a broadcast. A long track is followed only when the short tracks show
@@ -61,9 +62,11 @@ class HotsoundDetector {
   // code's main band (half the chip rate), the symbol tones and Doppler.
   static constexpr double kHalfBandwidth = 2000.0;
   static constexpr int kBasebandSize = 256;  // complex samples per window
-  // Carrier offsets searched, in window bins (23 Hz): 0, +-1, +-2 and
-  // +-2.5 (a phone moving at 1 m/s shifts the carrier by 2.3 bins).
-  static constexpr int kCarrierOffsets = 7;
+  // Carrier offsets searched, in window bins (23 Hz): every half bin from
+  // -2.5 to 2.5. A phone moving at 1 m/s shifts the carrier by 2.3 bins; a
+  // carrier half a bin from every offset searched would lose 4 dB (a hand's
+  // drift of 0.2 m/s did), a quarter of a bin loses 0.9 dB.
+  static constexpr int kCarrierOffsets = 11;
   static constexpr int kHopFrames = 3;  // frames from one window to the next
   static constexpr int kWindows = 4;    // windows a score adds up
   static constexpr int kLongWindows = 8;  // ... and the slower, finer one
@@ -104,8 +107,10 @@ class HotsoundDetector {
     int pool = 1;    // lags one statistic adds
     float threshold = 0.0f, long_threshold = 0.0f;  // raw track sums that score 1
     int row = 0;     // lags + cyclic padding
-    std::vector<int> drift;  // per carrier offset: statistics the code moves per window
-    // The last kLongWindows windows' statistics, kCarrierOffsets x lags each.
+    std::vector<int> offsets;  // the carrier offsets it tracks (indices)
+    std::vector<int> drift;    // per tracked offset: statistics the code moves per window
+    // The last kLongWindows windows' statistics in units of the window's
+    // mean lag power, one row (lags between kPad of padding) per offset.
     std::vector<std::vector<float>> ring;
     // Per window slot, the short track that ended there and its best sum;
     // the long track's best sum relative to its threshold when last updated
@@ -129,10 +134,11 @@ class HotsoundDetector {
   // its threshold's (1: on the air).
   float UpdateTracks(Family& f, int newest, bool update_long);
   // One step of a track: `to` = `from` moved by the drift and up to one
-  // lag, plus the window's scaled powers. Fills `from`'s cyclic padding.
-  // Returns the lane-wise maximum of `to`.
+  // lag, plus the window's powers. Fills `from`'s cyclic padding. Returns
+  // the lane-wise maximum of `to` when kTop (the last step), else zeros.
+  template <bool kTop>
   audio_dsp::Float4 ExtendTrack(const Family& f, float* from, float* to, const float* powers,
-                                float scale, int drift) const;
+                                int drift) const;
 
   HotsoundDetectorConfig config_;
   int step_;
@@ -157,14 +163,14 @@ class HotsoundDetector {
   int fill_ = 0;
   int skip_ = 0;               // input samples to drop before the next window
   // The window mixed down (and, once correlated, its lags); its spectrum and
-  // the spectrum half a bin up; a spectrum times the code's.
+  // the spectrum half a bin up; per carrier offset, a spectrum times the
+  // code's.
   std::vector<float> base_re_, base_im_, spec_re_, spec_im_, prod_re_, prod_im_;
   // The two spectra conditioned and centred.
   std::vector<float> whole_re_, whole_im_, half_re_, half_im_;
   std::vector<float> half_turn_re_, half_turn_im_;  // exp(-i pi m / kBasebandSize)
   uint32_t windows_ = 0;  // windows scored (wraps harmlessly), for the long tracks' every other window
   Family families_[2];
-  std::vector<float> scales_;  // per window slot: 1 / mean power, 0 if silent
   int ring_next_ = 0;          // the slot the next window goes to
   std::vector<float> pooled_;  // PoolSpread's partial sums
   // Track rows being built (kCarrierOffsets rows of the widest family).
