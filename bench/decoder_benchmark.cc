@@ -87,11 +87,11 @@ void BM_AcquisitionScorer(benchmark::State& state) {
 }
 BENCHMARK(BM_AcquisitionScorer)->Arg(0)->Arg(1)->Unit(benchmark::kMillisecond);
 
-// The hotsound wake-up detector alone on the same audio and blocks (items:
-// input samples). Its budget is 3 % of BM_DsssDecoderRealTime's time per
-// audio second, i.e. a real-time factor above ~33 times the decoder's.
-void BM_HotsoundDetectorRealTime(benchmark::State& state) {
-  const std::vector<float> signal = ReceivedBroadcast(10.0, -10.0);
+// The hotsound wake-up detector alone on `signal` as 16-bit samples in
+// 10 ms blocks (items: input samples). Its budget is 3 % of
+// BM_DsssDecoderRealTime's time per audio second, i.e. a real-time factor
+// above ~33 times the decoder's.
+void RunDetector(benchmark::State& state, const std::vector<float>& signal) {
   std::vector<int16_t> pcm(signal.size());
   for (size_t i = 0; i < signal.size(); ++i) {
     pcm[i] = static_cast<int16_t>(std::clamp(signal[i], -32768.0f, 32767.0f));
@@ -106,24 +106,17 @@ void BM_HotsoundDetectorRealTime(benchmark::State& state) {
   state.counters["x_real_time"] = benchmark::Counter(
       static_cast<double>(signal.size()) / 44100.0, benchmark::Counter::kIsIterationInvariantRate);
 }
+
+// On the same broadcast as the decoders.
+void BM_HotsoundDetectorRealTime(benchmark::State& state) {
+  RunDetector(state, ReceivedBroadcast(10.0, -10.0));
+}
 BENCHMARK(BM_HotsoundDetectorRealTime)->Unit(benchmark::kMicrosecond);
 
-// The detector alone on quiet room noise (-60 dBFS pink), as it runs for
-// hours between broadcasts.
+// On quiet room noise (-60 dBFS pink), as it runs for hours between
+// broadcasts.
 void BM_HotsoundDetectorIdle(benchmark::State& state) {
-  const std::vector<float> noise =
-      sorvel_sim::MakeNoise(sorvel_sim::NoiseKind::kPink, 10 * 44100, 33.0, 5);
-  std::vector<int16_t> pcm(noise.size());
-  for (size_t i = 0; i < noise.size(); ++i) {
-    pcm[i] = static_cast<int16_t>(std::clamp(noise[i], -32768.0f, 32767.0f));
-  }
-  auto detector = audio_sorvane::MakeHotsoundDetector(44100, 1);
-  for (auto _ : state) {
-    for (size_t start = 0; start + 441 <= pcm.size(); start += 441) {
-      benchmark::DoNotOptimize(detector->Process(std::span<const int16_t>(pcm).subspan(start, 441)));
-    }
-  }
-  state.counters["x_real_time"] = benchmark::Counter(10.0, benchmark::Counter::kIsIterationInvariantRate);
+  RunDetector(state, sorvel_sim::MakeNoise(sorvel_sim::NoiseKind::kPink, 10 * 44100, 33.0, 5));
 }
 BENCHMARK(BM_HotsoundDetectorIdle)->Unit(benchmark::kMicrosecond);
 
