@@ -59,16 +59,16 @@ void AddScaled(const Complex* a, Complex c, Complex* out, int n) {
   }
 }
 
-// a[m] *= b[m] (or conj(b[m])).
-void Multiply(Complex* a, const Complex* b, int n, bool conjugate) {
-  float* x = reinterpret_cast<float*>(a);
+// out[m] = a[m] b[m]; out may be a.
+void Multiply(const Complex* a, const Complex* b, int n, Complex* out) {
+  const float* x = reinterpret_cast<const float*>(a);
   const float* y = reinterpret_cast<const float*>(b);
-  const float sign = conjugate ? -1.0f : 1.0f;
+  float* z = reinterpret_cast<float*>(out);
   for (int i = 0; i < 2 * n; i += 2) {
-    const float br = y[i], bi = sign * y[i + 1];
-    const float re = x[i] * br - x[i + 1] * bi;
-    x[i + 1] = x[i] * bi + x[i + 1] * br;
-    x[i] = re;
+    const float re = x[i] * y[i] - x[i + 1] * y[i + 1];
+    const float im = x[i] * y[i + 1] + x[i + 1] * y[i];
+    z[i] = re;
+    z[i + 1] = im;
   }
 }
 
@@ -237,7 +237,7 @@ void MultipathScorer::WindowSpectrum(const BasebandView& view, int64_t start) {
 
 void MultipathScorer::Transform(const BasebandView& view, int64_t start, Frame* frame) {
   WindowSpectrum(view, start);
-  Multiply(spectrum_.data(), code_spectrum_.data(), fft_.GetSize(), false);
+  Multiply(spectrum_.data(), code_spectrum_.data(), fft_.GetSize(), spectrum_.data());
   fft_.Inverse(spectrum_.data(), buffer_.data());
   Borrow(&profile_pool_, &frame->profile);
   frame->profile.assign(buffer_.begin(), buffer_.begin() + lags_);
@@ -286,9 +286,10 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
     WindowSpectrum(view, frame_start);
     for (int b = -bins; b <= bins; ++b) {
       // Derotating by b steps takes bin k + b stride to bin k: a cyclic shift.
-      const auto from = spectrum_.begin() + ((b * stride) % n + n) % n;
-      std::copy(spectrum_.begin(), from, std::copy(from, spectrum_.end(), buffer_.begin()));
-      Multiply(buffer_.data(), code_spectrum_.data(), n, false);
+      const int shift = ((b * stride) % n + n) % n;
+      Multiply(spectrum_.data() + shift, code_spectrum_.data(), n - shift, buffer_.data());
+      Multiply(spectrum_.data(), code_spectrum_.data() + (n - shift), shift,
+               buffer_.data() + (n - shift));
       fft_.Inverse(buffer_.data(), buffer_.data());
       add_power(buffer_.data(), &search_powers_[static_cast<size_t>(b + bins) * lags_]);
     }
@@ -361,7 +362,7 @@ void MultipathScorer::Combine(const std::vector<std::complex<float>>& window,
   std::copy(weights_.begin(), weights_.end(), buffer_.begin());
   fft_.Forward(buffer_.data(), spectrum_.data());
   for (int k = 0; k < n; ++k) spectrum_[k] = std::conj(spectrum_[k]);
-  Multiply(spectrum_.data(), spectrum->data(), n, false);
+  Multiply(spectrum_.data(), spectrum->data(), n, spectrum_.data());
   fft_.Inverse(spectrum_.data(), buffer_.data());
   std::copy_n(buffer_.begin(), frame_size_, combined_.begin());
 }
