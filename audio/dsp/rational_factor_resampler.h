@@ -55,8 +55,10 @@ class RationalFactorResampler : public Resampler<T> {
   // For complex samples, the filters with each tap written twice (one per
   // part), as the inner loop reads them.
   std::vector<std::vector<float>> dot_filters_;
-  // Input not yet consumed, starting at the next output's first tap.
+  // Input not yet consumed, starting at the next output's first tap: the
+  // first held_ values.
   std::vector<T> delayed_input_;
+  int64_t held_ = 0;
   int phase_ = 0;
 };
 
