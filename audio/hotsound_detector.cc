@@ -148,31 +148,29 @@ SORVEL_MULTIVERSION void MixWindow(const float* window, const int* tap_start,
   *peak = audio_dsp::MaxLane4(top);
 }
 
-// prod = x * code over n bins (a multiple of four); returns the products'
-// total power.
-SORVEL_MULTIVERSION float MultiplySpectra(const float* x_re, const float* x_im,
-                                          const float* code_re, const float* code_im, int n,
-                                          float* prod_re, float* prod_im) {
+// The products' total power over all carrier offsets: sum over offsets d
+// and bins i < n (a multiple of four) of the spectrum's power at start[d] + i
+// (in `half` or `whole`, as offset d reads) times the code's at i.
+SORVEL_MULTIVERSION float ProductPower(const float* whole, const float* half, const int* start,
+                                       const float* code, int n) {
   using audio_dsp::Float4;
   using audio_dsp::Load4;
   Float4 total = {};
   for (int i = 0; i < n; i += 4) {
-    const Float4 a = Load4(x_re + i), b = Load4(x_im + i);
-    const Float4 c = Load4(code_re + i), e = Load4(code_im + i);
-    const Float4 re = a * c - b * e, im = a * e + b * c;
-    audio_dsp::Store4(prod_re + i, re);
-    audio_dsp::Store4(prod_im + i, im);
-    total += re * re + im * im;
+    Float4 spectra = {};
+    for (int d = 0; d < HotsoundDetector::kCarrierOffsets; ++d) {
+      spectra += Load4((kOffsetBins[d] == std::floor(kOffsetBins[d]) ? whole : half) + start[d] + i);
+    }
+    total += spectra * Load4(code + i);
   }
   return audio_dsp::Sum4(total);
 }
 
-// out = scale |re + i im|^2 over n values (a multiple of four).
-SORVEL_MULTIVERSION void Powers(const float* re, const float* im, int n, float scale, float* out) {
-  const audio_dsp::Float4 gain = audio_dsp::Splat4(scale);
+// out = |re + i im|^2 over n values (a multiple of four).
+void Powers(const float* re, const float* im, int n, float* out) {
   for (int t = 0; t < n; t += 4) {
     const audio_dsp::Float4 r = audio_dsp::Load4(re + t), i = audio_dsp::Load4(im + t);
-    audio_dsp::Store4(out + t, (r * r + i * i) * gain);
+    audio_dsp::Store4(out + t, r * r + i * i);
   }
 }
 
@@ -287,7 +285,7 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
   // The code band-limited to its chips' bins (|k| < chips / 2) and seen at
   // kN samples per frame: its spectrum is the chips' DFT on those bins.
   half_band_ = chips / 2;
-  product_size_ = (2 * half_band_ + 1 + 3) / 4 * 4;
+  product_size_ = (2 * half_band_ + 1 + 7) / 8 * 8;
   CHECK(product_size_ <= kN);
   code_re_.assign(product_size_, 0.0f);
   code_im_.assign(product_size_, 0.0f);
@@ -301,21 +299,20 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
     code_re_[k + half_band_] = static_cast<float>(value.real());
     code_im_[k + half_band_] = static_cast<float>(value.imag());
   }
+  code_power_.resize(product_size_);
+  Powers(code_re_.data(), code_im_.data(), product_size_, code_power_.data());
 
   window_.resize(window_size_);
   for (auto* v : {&base_re_, &base_im_, &spec_re_, &spec_im_}) v->resize(kN);
-  // Centred spectra, with room for the products' reads past the band.
-  for (auto* v : {&whole_re_, &whole_im_, &half_re_, &half_im_}) {
-    v->assign(product_size_ + 2 * kMaxShift + 4, 0.0f);
+  // Centred spectra and their powers, with room for the products' reads
+  // past the band, a multiple of four.
+  for (auto* v : {&whole_re_, &whole_im_, &half_re_, &half_im_, &whole_power_, &half_power_}) {
+    v->assign((product_size_ + 2 * kMaxShift + 4 + 3) / 4 * 4, 0.0f);
   }
   for (int m = 0; m < kN; ++m) {
     half_turn_re_.push_back(static_cast<float>(std::cos(std::numbers::pi * m / kN)));
     half_turn_im_.push_back(static_cast<float>(-std::sin(std::numbers::pi * m / kN)));
   }
-  // Products fill the first product_size_ bins of each offset's row; the
-  // rest stay zero.
-  prod_re_.assign(kCarrierOffsets * kN, 0.0f);
-  prod_im_.assign(kCarrierOffsets * kN, 0.0f);
   // A phone moving at v compresses the broadcast by v / c: the code's lag
   // moves by the same fraction of a hop per window, and its carrier by the
   // same fraction of the carrier frequency (one bin: window_rate Hz).
@@ -413,28 +410,29 @@ void HotsoundDetector::ScoreWindow() {
     }
     fft_.Forward(base_re_.data(), base_im_.data(), spec_re_.data(), spec_im_.data());
     Condition(spec_re_.data(), spec_im_.data(), half_re_.data(), half_im_.data());
-    // The spectrum times the code's per offset, and their total power, which
+    // Per carrier offset the spectrum times the code's, whose total power
     // gives the lags' mean power (the inverse transform is unnormalised:
     // sum |c|^2 = kN sum |product|^2). The products sit from bin 0 rather
     // than around it: a cyclic shift of the spectrum turns the lags' phases
     // but not their powers.
-    float total = 0.0f;
+    const int spectrum_size = static_cast<int>(whole_re_.size());
+    Powers(whole_re_.data(), whole_im_.data(), spectrum_size, whole_power_.data());
+    Powers(half_re_.data(), half_im_.data(), spectrum_size, half_power_.data());
+    int start[kCarrierOffsets];
     for (int d = 0; d < kCarrierOffsets; ++d) {
-      const int shift = static_cast<int>(std::floor(kOffsetBins[d]));
-      const bool half = kOffsetBins[d] != shift;
-      const float* x_re = (half ? half_re_.data() : whole_re_.data()) + kMaxShift + shift;
-      const float* x_im = (half ? half_im_.data() : whole_im_.data()) + kMaxShift + shift;
-      total += MultiplySpectra(x_re, x_im, code_re_.data(), code_im_.data(), product_size_,
-                               prod_re_.data() + d * kN, prod_im_.data() + d * kN);
+      start[d] = kMaxShift + static_cast<int>(std::floor(kOffsetBins[d]));
     }
+    const float total = ProductPower(whole_power_.data(), half_power_.data(), start,
+                                     code_power_.data(), product_size_);
     // Correlation powers in units of their mean.
     const float scale = kCarrierOffsets / total;
     int spread_row = 0;
     for (int d = 0; d < kCarrierOffsets; ++d) {
-      fft_.Inverse(prod_re_.data() + d * kN, prod_im_.data() + d * kN, base_re_.data(),
-                   base_im_.data());
+      const bool half = kOffsetBins[d] != std::floor(kOffsetBins[d]);
       float* powers = families_[0].ring[slot].data() + d * families_[0].row + kPad;
-      Powers(base_re_.data(), base_im_.data(), kN, scale, powers);
+      fft_.InverseProductPowers((half ? half_re_ : whole_re_).data() + start[d],
+                                (half ? half_im_ : whole_im_).data() + start[d], code_re_.data(),
+                                code_im_.data(), product_size_, scale, powers);
       if (kSpreadOffset[d]) {
         PoolSpread(powers, families_[1].ring[slot].data() + spread_row * families_[1].row + kPad);
         ++spread_row;

@@ -152,22 +152,21 @@ class HotsoundDetector {
   // Spectra are kept centred on the carrier: entry kMaxShift + half_band_
   // + f holds bin f, for |f| <= half_band_ + kMaxShift (the bins the carrier
   // offsets read). conj(code spectrum) on bins -half_band_..half_band_ from
-  // entry 0, zero-padded to product_size_ (a multiple of four).
+  // entry 0, zero-padded to product_size_ (a multiple of eight), and its
+  // power.
   int half_band_ = 0;
   int product_size_ = 0;
-  std::vector<float> code_re_, code_im_;
+  std::vector<float> code_re_, code_im_, code_power_;
   audio_dsp::Radix4Fft fft_;
   bool wide_steps_;
 
   std::vector<float> window_;  // the current window's input so far
   int fill_ = 0;
   int skip_ = 0;               // input samples to drop before the next window
-  // The window mixed down (and, once correlated, its lags); its spectrum and
-  // the spectrum half a bin up; per carrier offset, a spectrum times the
-  // code's.
-  std::vector<float> base_re_, base_im_, spec_re_, spec_im_, prod_re_, prod_im_;
-  // The two spectra conditioned and centred.
-  std::vector<float> whole_re_, whole_im_, half_re_, half_im_;
+  // The window mixed down; its spectrum and the spectrum half a bin up.
+  std::vector<float> base_re_, base_im_, spec_re_, spec_im_;
+  // The two spectra conditioned and centred, and their powers.
+  std::vector<float> whole_re_, whole_im_, half_re_, half_im_, whole_power_, half_power_;
   std::vector<float> half_turn_re_, half_turn_im_;  // exp(-i pi m / kBasebandSize)
   uint32_t windows_ = 0;  // windows scored (wraps harmlessly), for the long tracks' every other window
   Family families_[2];

@@ -28,6 +28,28 @@ Complex4 Multiply(Complex4 a, const float* w) {
   return {a.re * wr - a.im * wi, a.re * wi + a.im * wr};
 }
 
+}  // namespace
+
+// The input of InverseProductPowers: the product of two spectra on their
+// first n bins, zero above.
+struct Radix4Fft::Product {
+  const float *x_re, *x_im, *y_re, *y_im;
+  int n;
+};
+
+namespace {
+
+// The first stage's input at `at`: four values of (re, im), or with a
+// product, four of x * y with real and imaginary parts swapped (an inverse
+// transform run as a forward one).
+Complex4 FirstInput(const float* re, const float* im, const Radix4Fft::Product* product, int at) {
+  if (product == nullptr) return Load(re, im, at);
+  if (at >= product->n) return {Float4{}, Float4{}};
+  const Float4 a = Load4(product->x_re + at), b = Load4(product->x_im + at);
+  const Float4 c = Load4(product->y_re + at), d = Load4(product->y_im + at);
+  return {a * d + b * c, a * c - b * d};
+}
+
 // The four-point DFT of a0..a3 (exponent -2 pi i), in place, lane-wise.
 template <typename Complex>
 inline __attribute__((always_inline)) void Butterfly(Complex& a0, Complex& a1, Complex& a2, Complex& a3) {
@@ -75,18 +97,21 @@ std::vector<float> StageTwiddles(int size, int lanes) {
 }
 
 // The transform of `size` values through the scratch pairs a and b, with
-// the stages' twiddles `w`.
+// the stages' twiddles `w`. With `powers`, the last stage writes
+// power_scale |X[k]|^2 there instead of X to out_re and out_im.
 SORVEL_MULTIVERSION void Transform(int size, const float* w, const float* re, const float* im,
-                                   float* out_re, float* out_im, float* a_re, float* a_im,
-                                   float* b_re, float* b_im) {
+                                   const Radix4Fft::Product* product, float* out_re,
+                                   float* out_im, float* a_re, float* a_im, float* b_re,
+                                   float* b_im, float power_scale, float* powers) {
   const int quarter = size / 4;
   // First stage: length-4 transforms of x[j + r quarter], written to
   // 4 j + r (a transpose of each group of four butterflies).
   float* dst_re = a_re;
   float* dst_im = a_im;
   for (int j = 0; j < quarter; j += 4) {
-    Complex4 a0 = Load(re, im, j), a1 = Load(re, im, j + quarter);
-    Complex4 a2 = Load(re, im, j + 2 * quarter), a3 = Load(re, im, j + 3 * quarter);
+    Complex4 a0 = FirstInput(re, im, product, j), a1 = FirstInput(re, im, product, j + quarter);
+    Complex4 a2 = FirstInput(re, im, product, j + 2 * quarter);
+    Complex4 a3 = FirstInput(re, im, product, j + 3 * quarter);
     Butterfly(a0, a1, a2, a3);
     Transpose4(a0.re, a1.re, a2.re, a3.re);
     Transpose4(a0.im, a1.im, a2.im, a3.im);
@@ -107,6 +132,14 @@ SORVEL_MULTIVERSION void Transform(int size, const float* w, const float* re, co
       Butterfly(a0, a1, a2, a3);
       const int k = j % ns;
       const int base = (j - k) * 4 + k;
+      if (powers != nullptr && ns * 4 == size) {
+        const Float4 scale = Splat4(power_scale);
+        Store4(powers + base, (a0.re * a0.re + a0.im * a0.im) * scale);
+        Store4(powers + base + ns, (a1.re * a1.re + a1.im * a1.im) * scale);
+        Store4(powers + base + 2 * ns, (a2.re * a2.re + a2.im * a2.im) * scale);
+        Store4(powers + base + 3 * ns, (a3.re * a3.re + a3.im * a3.im) * scale);
+        continue;
+      }
       Store(dst_re, dst_im, base, a0);
       Store(dst_re, dst_im, base + ns, a1);
       Store(dst_re, dst_im, base + 2 * ns, a2);
@@ -124,6 +157,16 @@ struct ComplexWide {
 
 #define SORVEL_LOAD_COMPLEX(re, im, at) \
   ComplexWide { SORVEL_LOAD_WIDE((re) + (at)), SORVEL_LOAD_WIDE((im) + (at)) }
+
+// FirstInput eight values at a time (n a multiple of eight).
+SORVEL_WIDE inline ComplexWide FirstInputWide(const float* re, const float* im,
+                                              const Radix4Fft::Product* product, int at) {
+  if (product == nullptr) return SORVEL_LOAD_COMPLEX(re, im, at);
+  if (at >= product->n) return {Wide{}, Wide{}};
+  const Wide a = SORVEL_LOAD_WIDE(product->x_re + at), b = SORVEL_LOAD_WIDE(product->x_im + at);
+  const Wide c = SORVEL_LOAD_WIDE(product->y_re + at), d = SORVEL_LOAD_WIDE(product->y_im + at);
+  return {a * d + b * c, a * c - b * d};
+}
 
 // a *= the twiddles at tw (eight real parts, then eight imaginary).
 SORVEL_WIDE inline void MultiplyWide(ComplexWide& a, const float* tw) {
@@ -160,17 +203,19 @@ SORVEL_WIDE inline void StoreHalves(float* dst, int at, const Wide& v0, const Wi
 // Twiddles `w` per stage after the first and group of eight butterflies:
 // w^1, w^2, w^3, real and imaginary, eight lanes each. Where a group's
 // outputs are not eight in a row (the first two stages), each 128-bit half
-// holds four of them.
+// holds four of them. `powers` as Transform's.
 SORVEL_WIDE void TransformWide(int size, const float* w, const float* re, const float* im,
-                               float* out_re, float* out_im, float* a_re, float* a_im,
-                               float* b_re, float* b_im) {
+                               const Radix4Fft::Product* product, float* out_re, float* out_im,
+                               float* a_re, float* a_im, float* b_re, float* b_im,
+                               float power_scale, float* powers) {
   const int quarter = size / 4;
   float* dst_re = a_re;
   float* dst_im = a_im;
   for (int j = 0; j < quarter; j += 8) {
-    ComplexWide a0 = SORVEL_LOAD_COMPLEX(re, im, j), a1 = SORVEL_LOAD_COMPLEX(re, im, j + quarter);
-    ComplexWide a2 = SORVEL_LOAD_COMPLEX(re, im, j + 2 * quarter);
-    ComplexWide a3 = SORVEL_LOAD_COMPLEX(re, im, j + 3 * quarter);
+    ComplexWide a0 = FirstInputWide(re, im, product, j);
+    ComplexWide a1 = FirstInputWide(re, im, product, j + quarter);
+    ComplexWide a2 = FirstInputWide(re, im, product, j + 2 * quarter);
+    ComplexWide a3 = FirstInputWide(re, im, product, j + 3 * quarter);
     Butterfly(a0, a1, a2, a3);
     // Lane l's four outputs go to 4 (j + l) .. 4 (j + l) + 3.
     TransposeHalves(a0.re, a1.re, a2.re, a3.re);
@@ -198,6 +243,15 @@ SORVEL_WIDE void TransformWide(int size, const float* w, const float* re, const 
       }
       const int k = j % ns;
       const int base = (j - k) * 4 + k;
+      if (powers != nullptr && ns * 4 == size) {  // the last stage, from size 64: ns >= 16
+        const Wide scale = {power_scale, power_scale, power_scale, power_scale,
+                            power_scale, power_scale, power_scale, power_scale};
+        for (int r = 0; r < 4; ++r) {
+          const ComplexWide& a = r == 0 ? a0 : r == 1 ? a1 : r == 2 ? a2 : a3;
+          SORVEL_STORE_WIDE(powers + base + r * ns, (a.re * a.re + a.im * a.im) * scale);
+        }
+        continue;
+      }
       for (int r = 0; r < 4; ++r) {
         const ComplexWide& a = r == 0 ? a0 : r == 1 ? a1 : r == 2 ? a2 : a3;
         SORVEL_STORE_WIDE(dst_re + base + r * ns, a.re);
@@ -243,16 +297,24 @@ bool Radix4Fft::UseWide(bool wide) {
   return true;
 }
 
-void Radix4Fft::Forward(const float* re, const float* im, float* out_re, float* out_im) {
+void Radix4Fft::Run(const float* re, const float* im, const Product* product, float* out_re,
+                    float* out_im, float power_scale, float* powers) {
 #if defined(SORVEL_WIDE_PATHS)
   if (wide_) {
-    TransformWide(size_, wide_twiddles_.data(), re, im, out_re, out_im, a_re_.data(),
-                  a_im_.data(), b_re_.data(), b_im_.data());
+    TransformWide(size_, wide_twiddles_.data(), re, im, product, out_re, out_im, a_re_.data(),
+                  a_im_.data(), b_re_.data(), b_im_.data(), power_scale, powers);
     return;
   }
 #endif
-  Transform(size_, twiddles_.data(), re, im, out_re, out_im, a_re_.data(), a_im_.data(),
-            b_re_.data(), b_im_.data());
+  Transform(size_, twiddles_.data(), re, im, product, out_re, out_im, a_re_.data(),
+            a_im_.data(), b_re_.data(), b_im_.data(), power_scale, powers);
+}
+
+void Radix4Fft::InverseProductPowers(const float* x_re, const float* x_im, const float* y_re,
+                                     const float* y_im, int n, float scale, float* powers) {
+  CHECK(n >= 0 && n <= size_ && n % 8 == 0);
+  const Product product{x_re, x_im, y_re, y_im, n};
+  Run(nullptr, nullptr, &product, nullptr, nullptr, scale, powers);
 }
 
 namespace {

@@ -28,14 +28,30 @@ class Radix4Fft {
   bool UseWide(bool wide);
   // `size` values in from (re, im), out to (out_re, out_im); the outputs may
   // be the inputs.
-  void Forward(const float* re, const float* im, float* out_re, float* out_im);
+  void Forward(const float* re, const float* im, float* out_re, float* out_im) {
+    Run(re, im, nullptr, out_re, out_im, 0.0f, nullptr);
+  }
   void Inverse(const float* re, const float* im, float* out_re, float* out_im) {
     // Swapping real and imaginary parts turns a forward into an inverse
     // transform: swap(DFT(swap(x))) = N * IDFT(x).
     Forward(im, re, out_im, out_re);
   }
+  // The powers of a cyclic cross-correlation: scale |Inverse(x * y)[k]|^2
+  // into `powers` (`size` values), where the product is taken on the first
+  // n bins (a multiple of eight) and is zero above. The product and the
+  // powers are formed inside the transform's first and last stages, without
+  // passes of their own.
+  void InverseProductPowers(const float* x_re, const float* x_im, const float* y_re,
+                            const float* y_im, int n, float scale, float* powers);
+
+  struct Product;
 
  private:
+  // The forward transform of (re, im), or with `product` of its swapped
+  // product; into (out_re, out_im), or with `powers` their scaled powers.
+  void Run(const float* re, const float* im, const Product* product, float* out_re,
+           float* out_im, float power_scale, float* powers);
+
   int size_;
   // Per stage after the first, per group of four butterflies: the twiddles
   // w^1, w^2, w^3, real and imaginary, four lanes each; built when the

@@ -47,6 +47,37 @@ TEST(Radix4FftTest, MatchesGeneralTransform) {
   }
 }
 
+// The fused correlation powers against an explicit product, inverse and
+// powers, for products that fill all, part or none of the bins, on both
+// paths.
+TEST(Radix4FftTest, InverseProductPowersMatchesExplicitSteps) {
+  std::mt19937 rng(7);
+  std::normal_distribution<float> normal;
+  for (int size : {16, 64, 256}) {
+    std::vector<float> x_re(size), x_im(size), y_re(size), y_im(size);
+    for (auto* v : {&x_re, &x_im, &y_re, &y_im}) {
+      for (float& f : *v) f = normal(rng);
+    }
+    for (int n : {size, size * 11 / 16 / 8 * 8, 0}) {
+      std::vector<std::complex<float>> product(size), lags(size);
+      for (int i = 0; i < n; ++i) product[i] = std::complex(x_re[i], x_im[i]) * std::complex(y_re[i], y_im[i]);
+      ComplexFFTTransformer(size, /*normalize_inverse=*/false).Inverse(product.data(), lags.data());
+      for (bool wide : {false, true}) {
+        Radix4Fft fft(size);
+        if (!fft.UseWide(wide)) continue;
+        std::vector<float> powers(size, -1.0f);
+        fft.InverseProductPowers(x_re.data(), x_im.data(), y_re.data(), y_im.data(), n, 0.5f,
+                                 powers.data());
+        for (int k = 0; k < size; ++k) {
+          const float expected = 0.5f * std::norm(lags[k]);
+          ASSERT_NEAR(powers[k], expected, 1e-4f * size + 1e-5f * expected)
+              << size << " n " << n << (wide ? " wide" : "") << " lag " << k;
+        }
+      }
+    }
+  }
+}
+
 // The power-of-two transform against the general one at odd and even
 // powers of two, both directions (the inverse normalised), in place and not.
 TEST(PowerOfTwoFftTest, MatchesGeneralTransform) {
