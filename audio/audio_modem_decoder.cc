@@ -6,6 +6,7 @@
 
 #include "audio/sorvane/crc16_coder.h"
 #include "base/logging.h"
+#include "base/refill.h"
 
 namespace audio_sorvane {
 
@@ -99,32 +100,13 @@ bool AudioModemDecoder::DecodeTokens(DecodeResults* decode_results, int num_mess
   }
   // Results overwrite the entries already in the list, keeping their
   // storage, so that steady requests allocate nothing.
-  size_t num_tokens = 0;
+  sorvel_base::Refill<TokenResult> tokens(&decode_results->tokens, &spare_tokens_);
   const auto add = [&](const DecodedToken& candidate, size_t num_bytes) {
-    if (num_tokens == decode_results->tokens.size()) {
-      if (spare_tokens_.empty()) {
-        decode_results->tokens.emplace_back();
-      } else {
-        decode_results->tokens.push_back(std::move(spare_tokens_.back()));
-        spare_tokens_.pop_back();
-      }
-    }
-    TokenResult& token = decode_results->tokens[num_tokens++];
+    TokenResult& token = tokens.Next();
     token.bytes.assign(candidate.bytes.begin(), candidate.bytes.begin() + num_bytes);
     token.position = candidate.position;
     token.score_millis = static_cast<int32_t>(std::lround(candidate.score * 1000.0f));
   };
-  struct Trim {
-    std::vector<TokenResult>* list;
-    std::vector<TokenResult>* spares;
-    const size_t* count;
-    ~Trim() {
-      while (list->size() > *count) {
-        spares->push_back(std::move(list->back()));
-        list->pop_back();
-      }
-    }
-  } trim{&decode_results->tokens, &spare_tokens_, &num_tokens};
 
   audio_sorvane::DecodeResults& raw = raw_;
   raw.detection_times.reserve(256);  // see below
@@ -167,14 +149,14 @@ bool AudioModemDecoder::DecodeTokens(DecodeResults* decode_results, int num_mess
                                            raw.detection_times.end());
     decode_results->detection_scores.assign(raw.detection_scores.begin(),
                                             raw.detection_scores.end());
-    if (num_tokens == 0 && try_room && dtmf_decoder_->GetReverberantToken(&raw)) {
+    if (tokens.count() == 0 && try_room && dtmf_decoder_->GetReverberantToken(&raw)) {
       for (const DecodedToken& candidate : raw.tokens) {
         if (!coder.Verify(candidate.bytes)) continue;
         add(candidate, candidate.bytes.size() - 2);
         break;  // the best fit that passes: later ones only add false-pass risk
       }
     }
-    return num_tokens > 0;
+    return tokens.count() > 0;
   }
   LOG(ERROR) << "Unsupported value for num_crc_check_bytes";
   return false;

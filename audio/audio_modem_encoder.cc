@@ -52,17 +52,18 @@ void AudioModemEncoder::Encode(const std::vector<uint8_t>& token_bytes,
 
 void AudioModemEncoder::MakeStartTransition(std::span<const float> audio_samples,
                                             std::vector<float>* transition) const {
-  if (kind_ == kDsss) {
-    dsss_encoder_->MakeStartTransition(audio_samples, transition);
-  } else if (transition != nullptr) {
-    transition->clear();
-  }
+  Transition(&SorvaneEncoder::MakeStartTransition, audio_samples, transition);
 }
 
 void AudioModemEncoder::MakeStopTransition(std::span<const float> audio_samples,
                                            std::vector<float>* transition) const {
+  Transition(&SorvaneEncoder::MakeStopTransition, audio_samples, transition);
+}
+
+void AudioModemEncoder::Transition(TransitionMaker make, std::span<const float> audio_samples,
+                                   std::vector<float>* transition) const {
   if (kind_ == kDsss) {
-    dsss_encoder_->MakeStopTransition(audio_samples, transition);
+    (dsss_encoder_.get()->*make)(audio_samples, transition);
   } else if (transition != nullptr) {
     transition->clear();
   }

@@ -48,6 +48,11 @@ class AudioModemEncoder {
   const DtmfEncoder* dtmf_encoder() const { return dtmf_encoder_.get(); }
 
  private:
+  using TransitionMaker = bool (SorvaneEncoder::*)(std::span<const float>,
+                                                   std::vector<float>*) const;
+  // The DSSS encoder's transition, or an empty one for the multi-tone scheme.
+  void Transition(TransitionMaker make, std::span<const float> audio_samples,
+                  std::vector<float>* transition) const;
   std::unique_ptr<SorvaneEncoder> dsss_encoder_;
   std::unique_ptr<DtmfEncoder> dtmf_encoder_;
   Kind kind_;

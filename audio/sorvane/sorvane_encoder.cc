@@ -95,6 +95,25 @@ bool TransitionArgumentsValid(const char* caller, std::span<const float> input,
   return true;
 }
 
+// n samples of `input` repeated cyclically under a linear ramp: rising
+// (k / (n + 1), k = 1..n) and ending on input's last sample, or falling
+// (k = n..1) from its first, so that either joins the broadcast without a
+// step.
+bool MakeRamp(const char* caller, int n, std::span<const float> input,
+              std::vector<float>* output, bool rising) {
+  if (!TransitionArgumentsValid(caller, input, output)) return false;
+  const int length = static_cast<int>(input.size());
+  output->resize(n);
+  if (n == 0) return true;
+  int s = rising ? length - 1 - (n - 1) % length : 0;
+  for (int i = 0; i < n; ++i) {
+    const int k = rising ? i + 1 : n - i;
+    (*output)[i] = static_cast<float>(k) / static_cast<float>(n + 1) * input[s];
+    if (++s == length) s = 0;
+  }
+  return true;
+}
+
 }  // namespace
 
 int SorvaneEncoder::TransitionLength() const {
@@ -104,30 +123,12 @@ int SorvaneEncoder::TransitionLength() const {
 
 bool SorvaneEncoder::MakeStartTransition(std::span<const float> input,
                                          std::vector<float>* output) const {
-  if (!TransitionArgumentsValid("MakeStartTransition", input, output)) return false;
-  const int n = TransitionLength();
-  const int length = static_cast<int>(input.size());
-  output->resize(n);
-  if (n == 0) return true;
-  int s = length - 1 - (n - 1) % length;
-  for (int i = 0; i < n; ++i) {
-    (*output)[i] = static_cast<float>(i + 1) / static_cast<float>(n + 1) * input[s];
-    if (++s == length) s = 0;
-  }
-  return true;
+  return MakeRamp("MakeStartTransition", TransitionLength(), input, output, /*rising=*/true);
 }
 
 bool SorvaneEncoder::MakeStopTransition(std::span<const float> input,
                                         std::vector<float>* output) const {
-  if (!TransitionArgumentsValid("MakeStopTransition", input, output)) return false;
-  const int n = TransitionLength();
-  const int length = static_cast<int>(input.size());
-  output->resize(n);
-  for (int i = 0, s = 0; i < n; ++i) {
-    (*output)[i] = static_cast<float>(n - i) / static_cast<float>(n + 1) * input[s];
-    if (++s == length) s = 0;
-  }
-  return true;
+  return MakeRamp("MakeStopTransition", TransitionLength(), input, output, /*rising=*/false);
 }
 
 }  // namespace audio_sorvane

@@ -6,6 +6,7 @@
 
 #include "audio/dsp/batch_top_n.h"
 #include "base/logging.h"
+#include "base/refill.h"
 
 namespace audio_sorvane {
 
@@ -54,21 +55,10 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
                                  std::vector<DecodedToken>* token_candidates) const {
   CHECK(scores_table);
   CHECK(token_candidates);
-  size_t num_candidates = 0;
   // Candidates overwrite the entries already in the list, keeping their
   // storage; on every way out the list is cut to the new count, the entries
   // cut off kept as spares for later selections.
-  struct Trim {
-    std::vector<DecodedToken>* list;
-    std::vector<DecodedToken>* spares;
-    const size_t* count;
-    ~Trim() {
-      while (list->size() > *count) {
-        spares->push_back(std::move(list->back()));
-        list->pop_back();
-      }
-    }
-  } trim{token_candidates, &scratch_.spare_candidates, &num_candidates};
+  sorvel_base::Refill<DecodedToken> candidates(token_candidates, &scratch_.spare_candidates);
   const int rows = params_.alphabet_size;
   const int period = symbol_period_;
   Scratch& s = scratch_;
@@ -196,20 +186,12 @@ void TokenSelector::SelectTokens(const SymbolScoreMap& symbol_scores,
       sequence.pop_back();
       if (check != ComputeCheckSymbol(params_.alphabet_size, sequence)) continue;
     }
-    if (num_candidates == token_candidates->size()) {
-      if (s.spare_candidates.empty()) {
-        token_candidates->emplace_back();
-      } else {
-        token_candidates->push_back(std::move(s.spare_candidates.back()));
-        s.spare_candidates.pop_back();
-      }
-    }
-    DecodedToken& candidate = (*token_candidates)[num_candidates++];
+    DecodedToken& candidate = candidates.Next();
     candidate.symbols.assign(sequence.begin(), sequence.end());
     candidate.score = score;
     candidate.bytes.clear();
     candidate.position = s.first_position[k];
-    if (static_cast<int>(num_candidates) == params_.max_candidates_to_return) break;
+    if (static_cast<int>(candidates.count()) == params_.max_candidates_to_return) break;
   }
 }
 
