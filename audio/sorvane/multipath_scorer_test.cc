@@ -121,6 +121,15 @@ class MultipathScorerTest : public testing::Test {
     return errors;
   }
 
+  // SymbolErrors of a new scorer with `params` that tracks from `start`
+  // at rest.
+  int ErrorsFromStart(const MultipathScorerParams& params, const Baseband& baseband,
+                      const std::vector<int>& symbols, int count, int start = kStart) const {
+    MultipathScorer scorer(coder_, params);
+    scorer.StartTrack(start, 0.0f);
+    return SymbolErrors(scorer, baseband.View(), symbols, count);
+  }
+
   SymbolWaveCoder coder_;
   std::vector<float> fine_code_;
 };
@@ -159,20 +168,15 @@ TEST_F(MultipathScorerTest, ScoreGathersEchoesAroundAnchor) {
   const std::vector<int> symbols = RandomSymbols(kFrames + 5, 21);
   const Baseband baseband = Receive(symbols, {kEchoes, 0.0, 4.0, 3});
   for (int anchor : {-44, 0, 44, 52}) {
-    MultipathScorer scorer(coder_, {});
-    scorer.StartTrack(kStart + anchor, 0.0f);
-    EXPECT_EQ(SymbolErrors(scorer, baseband.View(), symbols, kFrames), 0) << "anchor " << anchor;
+    EXPECT_EQ(ErrorsFromStart({}, baseband, symbols, kFrames, kStart + anchor), 0)
+        << "anchor " << anchor;
   }
 
   const Baseband noisy = Receive(symbols, {kEchoes, 0.0, 5.5, 4});
   MultipathScorerParams strongest_only;
   strongest_only.gate = 1e9f;
-  MultipathScorer rake(coder_, {});
-  MultipathScorer strongest(coder_, strongest_only);
-  rake.StartTrack(kStart, 0.0f);
-  strongest.StartTrack(kStart, 0.0f);
-  const int rake_errors = SymbolErrors(rake, noisy.View(), symbols, kFrames);
-  const int strongest_errors = SymbolErrors(strongest, noisy.View(), symbols, kFrames);
+  const int rake_errors = ErrorsFromStart({}, noisy, symbols, kFrames);
+  const int strongest_errors = ErrorsFromStart(strongest_only, noisy, symbols, kFrames);
   EXPECT_LT(2 * rake_errors, strongest_errors) << rake_errors << " vs " << strongest_errors;
   EXPECT_GE(strongest_errors, 4);
 }
@@ -202,13 +206,9 @@ TEST_F(MultipathScorerTest, DryChannelGatesNoiseLags) {
   MultipathScorerParams one_lag;
   one_lag.lead = 0;
   one_lag.span = 0;
-  MultipathScorer rake(coder_, {});
-  MultipathScorer single(coder_, one_lag);
-  rake.StartTrack(kStart, 0.0f);
-  single.StartTrack(kStart, 0.0f);
-  const int single_errors = SymbolErrors(single, baseband.View(), symbols, kFrames);
+  const int single_errors = ErrorsFromStart(one_lag, baseband, symbols, kFrames);
   ASSERT_GE(single_errors, 8);
-  EXPECT_LE(SymbolErrors(rake, baseband.View(), symbols, kFrames),
+  EXPECT_LE(ErrorsFromStart({}, baseband, symbols, kFrames),
             single_errors + single_errors / 4 + 3);
 }
 
