@@ -1,6 +1,6 @@
-// The command-line tool's input reading on arbitrary file images (any
-// format libsndfile recognises), then the samples through a decoder when
-// the header describes something a phone could record.
+// The command-line tool's WAV reader on arbitrary file images, then the
+// samples through a decoder when the header describes something a phone
+// could record.
 #include <cstddef>
 #include <cstdint>
 #include <span>

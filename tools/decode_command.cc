@@ -1,7 +1,5 @@
 #include "tools/decode_command.h"
 
-#include <sndfile.h>
-
 #include <algorithm>
 #include <cstdint>
 #include <cstdio>
@@ -15,6 +13,7 @@
 #include "audio/audio_modem_decoder.h"
 #include "audio/modem_config.h"
 #include "tools/modem_options.h"
+#include "tools/wav_io.h"
 
 namespace sorvel_cli {
 namespace {
@@ -33,10 +32,6 @@ struct DecodeOptions {
 // 16-bit scale.
 class AudioSource {
  public:
-  ~AudioSource() {
-    if (file_ != nullptr) sf_close(file_);
-  }
-
   std::string Open(const DecodeOptions& o) {
     if (o.input == "-") {
       rate_ = o.raw_rate;
@@ -44,24 +39,22 @@ class AudioSource {
       if (rate_ <= 0 || channels_ < 1) return "--rate and --channels must be positive";
       return "";
     }
-    SF_INFO info = {};
-    file_ = sf_open(o.input.c_str(), SFM_READ, &info);
-    if (file_ == nullptr) return "cannot read " + o.input + ": " + sf_strerror(nullptr);
-    rate_ = static_cast<float>(info.samplerate);
-    channels_ = info.channels;
-    file_pcm16_ = (info.format & SF_FORMAT_SUBMASK) == SF_FORMAT_PCM_16;
+    if (std::string e = file_.Open(o.input); !e.empty()) return e;
+    from_file_ = true;
+    rate_ = static_cast<float>(file_.sample_rate());
+    channels_ = file_.channels();
     return "";
   }
 
   // Whether Read gives 16-bit samples.
-  bool pcm16() const { return file_ == nullptr || file_pcm16_; }
+  bool pcm16() const { return !from_file_ || file_.pcm16(); }
 
   // Up to `frames` frames; fewer (possibly none) at the end of the input.
   template <typename Sample>
   void Read(size_t frames, std::vector<Sample>* samples) {
     samples->resize(frames * channels_);
     size_t got = 0;
-    if (file_ != nullptr) {
+    if (from_file_) {
       std::vector<Sample>& chunk = Chunk(samples);
       // Files are read a few hundred milliseconds at a time (one read per
       // block cost more system time than a DTMF decoder spends on it) and
@@ -69,7 +62,7 @@ class AudioSource {
       if (next_ == chunk.size()) {
         const size_t chunk_frames = 32 * frames;
         chunk.resize(chunk_frames * channels_);
-        chunk.resize(ReadFile(chunk.data(), chunk_frames) * channels_);
+        chunk.resize(file_.Read(chunk.data(), chunk_frames) * channels_);
         next_ = 0;
       }
       const size_t n = std::min(frames * channels_, chunk.size() - next_);
@@ -94,22 +87,8 @@ class AudioSource {
   std::vector<float>& Chunk(std::vector<float>*) { return float_chunk_; }
   std::vector<int16_t>& Chunk(std::vector<int16_t>*) { return pcm16_chunk_; }
 
-  size_t ReadFile(int16_t* to, size_t frames) {
-    return static_cast<size_t>(sf_readf_short(file_, to, static_cast<sf_count_t>(frames)));
-  }
-  // Float reads keep any other format's full resolution (short reads of a
-  // float file return only -1, 0 and 1); scaled to the 16-bit range.
-  size_t ReadFile(float* to, size_t frames) {
-    const auto read =
-        static_cast<size_t>(sf_readf_float(file_, to, static_cast<sf_count_t>(frames)));
-    for (size_t i = 0; i < read * channels_; ++i) {
-      to[i] = std::clamp(to[i] * 32768.0f, -32768.0f, 32767.0f);
-    }
-    return read;
-  }
-
-  SNDFILE* file_ = nullptr;
-  bool file_pcm16_ = false;
+  SoundFileReader file_;
+  bool from_file_ = false;
   float rate_ = 0.0f;
   int channels_ = 1;
   std::vector<uint8_t> raw_;
