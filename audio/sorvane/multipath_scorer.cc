@@ -87,6 +87,32 @@ void GiveBack(std::vector<std::vector<Complex>>* pool, std::vector<Complex>* buf
   pool->emplace_back().swap(*buffer);
 }
 
+// The transform length for correlating windows of `window` samples with
+// templates of up to `longest` (the code or the lag weights): the power of two
+// that holds the window whole, or the one below when the window overhangs it
+// by at most an eighth (and it still holds a template); the overhang is then
+// added back directly by AddOverhang, for less than the larger transform.
+int TransformSize(int window, int longest, bool whole) {
+  const int below = static_cast<int>(std::bit_floor(static_cast<unsigned>(window)));
+  if (!whole && window - below <= below / 8 && longest <= below && below >= 16) return below;
+  return std::max(16, static_cast<int>(std::bit_ceil(static_cast<unsigned>(window))));
+}
+
+// A cyclic correlation of length n computes out[j] = sum_i a[i] x[(j + i) mod n]
+// from the first n samples of x; this adds what the linear one has beyond
+// it, a[i] (x[j + i] - x[j + i - n]) wherever j + i >= n, for j < count.
+// `overhang[q]` holds x[n + q] - x[q] for q < count + a_size - 1 - n.
+// `a(i)` gives a[i].
+template <typename Coefficients>
+void AddOverhang(Coefficients a, int a_size, const Complex* overhang, int n, int count,
+                 Complex* out) {
+  for (int j = std::max(0, n - a_size + 1); j < count; ++j) {
+    Complex sum;
+    for (int i = n - j; i < a_size; ++i) sum += a(i) * overhang[j + i - n];
+    out[j] += sum;
+  }
+}
+
 // The unit phasor of c (1 when c is 0).
 Complex Direction(Complex c) {
   const float magnitude = std::hypot(c.real(), c.imag());
@@ -105,7 +131,7 @@ MultipathScorer::MultipathScorer(const SymbolWaveCoder& coder,
       use_quadrature_(coder.params().use_quadrature),
       code_(coder.baseband_code()),
       tones_(coder.baseband_tones()),
-      fft_(std::max(16, static_cast<int>(std::bit_ceil(static_cast<unsigned>(window_)))),
+      fft_(TransformSize(window_, std::max(frame_size_, lags_), params.whole_window_transform),
            /*normalize_inverse=*/true) {
   CHECK(params_.lead >= 0);
   CHECK(params_.span >= 0);
@@ -118,6 +144,12 @@ MultipathScorer::MultipathScorer(const SymbolWaveCoder& coder,
   buffer_.assign(n, {});
   spectrum_.assign(n, {});
   rotation_.resize(window_);
+  derotated_.resize(window_);
+  overhang_.resize(std::max(0, window_ - n));
+  if (window_ > n) {
+    turns_.resize(n);
+    for (int q = 0; q < n; ++q) turns_[q] = std::polar(1.0, -2.0 * std::numbers::pi * q / n);
+  }
   std::copy(code_.begin(), code_.end(), buffer_.begin());
   code_spectrum_.resize(n);
   fft_.Forward(buffer_.data(), code_spectrum_.data());
@@ -220,7 +252,7 @@ void MultipathScorer::Derotate(const BasebandView& view, int64_t start) {
       2.0 * std::numbers::pi);
   const float cr = static_cast<float>(std::cos(phase)), ci = static_cast<float>(std::sin(phase));
   const float* r = reinterpret_cast<const float*>(rotation_.data());
-  float* out = reinterpret_cast<float*>(buffer_.data());
+  float* out = reinterpret_cast<float*>(derotated_.data());
   for (int i = 0; i < window_; ++i) {
     const float pr = r[2 * i] * cr - r[2 * i + 1] * ci;
     const float pi = r[2 * i] * ci + r[2 * i + 1] * cr;
@@ -231,14 +263,33 @@ void MultipathScorer::Derotate(const BasebandView& view, int64_t start) {
 
 void MultipathScorer::WindowSpectrum(const BasebandView& view, int64_t start) {
   Derotate(view, start);
-  std::fill(buffer_.begin() + window_, buffer_.end(), std::complex<float>());
-  fft_.Forward(buffer_.data(), spectrum_.data());
+  Spectrum(derotated_, spectrum_.data());
+}
+
+void MultipathScorer::Spectrum(const std::vector<Complex>& window, Complex* spectrum) {
+  const int n = fft_.GetSize();
+  const int kept = std::min(n, static_cast<int>(window.size()));
+  std::copy_n(window.begin(), kept, buffer_.begin());
+  std::fill(buffer_.begin() + kept, buffer_.end(), Complex());
+  fft_.Forward(buffer_.data(), spectrum);
+}
+
+void MultipathScorer::AddCodeOverhang(int shift, Complex* profile) {
+  const int n = fft_.GetSize();
+  if (window_ <= n) return;
+  // The window as the shifted spectrum has it: turned by shift bins.
+  for (int q = 0; q < window_ - n; ++q) {
+    const Complex turn = turns_[static_cast<size_t>(shift) * q % n];
+    overhang_[q] = (derotated_[n + q] - derotated_[q]) * turn;
+  }
+  AddOverhang([&](int i) { return code_[i]; }, frame_size_, overhang_.data(), n, lags_, profile);
 }
 
 void MultipathScorer::Transform(const BasebandView& view, int64_t start, Frame* frame) {
   WindowSpectrum(view, start);
   Multiply(spectrum_.data(), code_spectrum_.data(), fft_.GetSize(), spectrum_.data());
   fft_.Inverse(spectrum_.data(), buffer_.data());
+  AddCodeOverhang(0, buffer_.data());
   Borrow(&profile_pool_, &frame->profile);
   frame->profile.assign(buffer_.begin(), buffer_.begin() + lags_);
 }
@@ -291,6 +342,7 @@ float MultipathScorer::SearchDoppler(const BasebandView& view, int64_t start) {
       Multiply(spectrum_.data(), code_spectrum_.data() + (n - shift), shift,
                buffer_.data() + (n - shift));
       fft_.Inverse(buffer_.data(), buffer_.data());
+      AddCodeOverhang(shift, buffer_.data());
       add_power(buffer_.data(), &search_powers_[static_cast<size_t>(b + bins) * lags_]);
     }
   }
@@ -352,19 +404,20 @@ void MultipathScorer::Combine(const std::vector<std::complex<float>>& window,
   }
   const int n = fft_.GetSize();
   if (spectrum->empty()) {
-    std::fill(buffer_.begin(), buffer_.end(), std::complex<float>());
-    std::copy(window.begin(), window.end(), buffer_.begin());
     Borrow(&spectrum_pool_, spectrum);
     spectrum->resize(n);
-    fft_.Forward(buffer_.data(), spectrum->data());
+    Spectrum(window, spectrum->data());
   }
-  std::fill(buffer_.begin(), buffer_.end(), std::complex<float>());
-  std::copy(weights_.begin(), weights_.end(), buffer_.begin());
-  fft_.Forward(buffer_.data(), spectrum_.data());
+  Spectrum(weights_, spectrum_.data());
   for (int k = 0; k < n; ++k) spectrum_[k] = std::conj(spectrum_[k]);
   Multiply(spectrum_.data(), spectrum->data(), n, spectrum_.data());
   fft_.Inverse(spectrum_.data(), buffer_.data());
   std::copy_n(buffer_.begin(), frame_size_, combined_.begin());
+  if (window_ > n) {
+    for (int q = 0; q < window_ - n; ++q) overhang_[q] = window[n + q] - window[q];
+    AddOverhang([&](int m) { return std::conj(weights_[m]); }, lags_, overhang_.data(), n,
+                frame_size_, combined_.data());
+  }
 }
 
 bool MultipathScorer::Score(const BasebandView& view, int64_t k, audio_dsp::FloatVector* scores) {
@@ -393,7 +446,7 @@ bool MultipathScorer::Score(const BasebandView& view, int64_t k, audio_dsp::Floa
     if (!HasWindow(view, FrameStart(k))) return false;
     Derotate(view, FrameStart(k));
     Borrow(&window_pool_, &own.window);
-    own.window.assign(buffer_.begin(), buffer_.begin() + window_);
+    own.window.assign(derotated_.begin(), derotated_.end());
   }
   neighbours_.clear();
   power_.assign(lags_, 0.0);

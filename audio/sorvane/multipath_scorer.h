@@ -43,6 +43,11 @@ struct MultipathScorerParams {
   float max_doppler = 2.35f;   // searched on each side of 0, cycles per frame (>= 0)
   float doppler_step = 0.15f;  // finest Doppler step, cycles per frame (> 0)
   int doppler_frames = 4;      // frames whose powers the Doppler search sums (>= 1)
+  // Transforms that hold a frame's lag window whole, the reference path;
+  // otherwise one half that size when the window overhangs it by at most an
+  // eighth, the overhang added directly. The two agree to float rounding
+  // (scores within a relative 1e-4).
+  bool whole_window_transform = false;
 };
 
 // A view of the buffered baseband: samples real[i] + j imag[i] have the
@@ -74,6 +79,7 @@ class MultipathScorer {
   // Forgets the track and every cached frame.
   void Reset();
   bool has_track() const { return has_track_; }
+  int transform_size() const { return fft_.GetSize(); }
   float doppler() const { return doppler_; }
   double period() const { return period_; }
   int64_t FrameStart(int64_t k) const;
@@ -107,8 +113,16 @@ class MultipathScorer {
     audio_dsp::FloatVector scores;
   };
   // spectrum_ = the spectrum of the window of a frame starting at `start`,
-  // derotated by the offset of rotation_ and zero-padded.
+  // derotated by the offset of rotation_ (its first transform-size samples,
+  // zero-padded when fewer).
   void WindowSpectrum(const BasebandView& view, int64_t start);
+  // The transform of the first transform-size values of `window`,
+  // zero-padded.
+  void Spectrum(const std::vector<std::complex<float>>& window, std::complex<float>* spectrum);
+  // Completes the code correlation `profile` (lags_ values) of derotated_
+  // computed cyclically from a spectrum shifted by `shift` bins, when the
+  // window overhangs the transform.
+  void AddCodeOverhang(int shift, std::complex<float>* profile);
   // Fills the profile of the frame at `start` from the view: the baseband
   // derotated by the offset of rotation_, correlated with the code.
   void Transform(const BasebandView& view, int64_t start, Frame* frame);
@@ -117,7 +131,7 @@ class MultipathScorer {
   Frame& FrameAt(int64_t k);
   // Writes the window of a frame starting at `start`, derotated by the
   // Doppler offset of rotation_ with phase zero at stream index 0, to
-  // buffer_.
+  // derotated_.
   void Derotate(const BasebandView& view, int64_t start);
   // Fills rotation_ for a Doppler offset.
   void SetRotation(float doppler);
@@ -155,7 +169,12 @@ class MultipathScorer {
   std::vector<std::vector<std::complex<float>>> spectrum_pool_;
 
   // Scratch.
-  std::vector<std::complex<float>> buffer_;
+  std::vector<std::complex<float>> buffer_;     // transform-size
+  std::vector<std::complex<float>> derotated_;  // the window last derotated
+  // When the window overhangs the transform: its last samples less its
+  // first ones, and exp(-2 pi j q / transform size).
+  std::vector<std::complex<float>> overhang_;
+  std::vector<std::complex<float>> turns_;
   std::vector<std::complex<float>> spectrum_;
   std::vector<std::complex<float>> channel_;
   std::vector<std::complex<float>> reference_;

@@ -158,6 +158,42 @@ TEST_F(MultipathScorerTest, SearchDopplerFindsOffset) {
   }
 }
 
+// Verifies that transforms shorter than the receiver's lag window (10 ms
+// before the frame, 20 ms after: 1076 samples), the overhang added
+// directly, find the Doppler offset and score the frames as transforms
+// holding the window whole do: in echoes (lags combined through transforms)
+// and in a dry channel (combined directly), at rest and moving. The long
+// echoes reach the lags whose correlations run past the transform.
+TEST_F(MultipathScorerTest, OverhangingTransformMatchesWholeWindow) {
+  const std::vector<Path> long_echoes = {
+      {0, {0.5, 0.0}}, {60, {0.0, 0.6}}, {130, {-0.6, 0.2}}, {200, {0.4, 0.4}}, {275, {0.0, -0.9}}};
+  MultipathScorerParams receiver;
+  receiver.lead = 147;
+  receiver.span = 294;
+  MultipathScorerParams whole = receiver;
+  whole.whole_window_transform = true;
+  const std::vector<int> symbols = RandomSymbols(12, 9);
+  for (const std::vector<Path>* paths : {&long_echoes, &kDry}) {
+    for (double doppler : {0.0, 1.3}) {
+      SCOPED_TRACE(testing::Message() << paths->size() << " paths, doppler " << doppler);
+      const Baseband baseband = Receive(symbols, {*paths, doppler, 2.0, 17});
+      MultipathScorer fast(coder_, receiver), reference(coder_, whole);
+      EXPECT_EQ(fast.transform_size(), 1024);
+      EXPECT_EQ(reference.transform_size(), 2048);
+      const float found = reference.SearchDoppler(baseband.View(), kStart);
+      EXPECT_EQ(fast.SearchDoppler(baseband.View(), kStart), found);
+      fast.StartTrack(kStart, found);
+      reference.StartTrack(kStart, found);
+      audio_dsp::FloatVector a, b;
+      for (int k = 0; k < 8; ++k) {
+        ASSERT_TRUE(fast.Score(baseband.View(), k, &a));
+        ASSERT_TRUE(reference.Score(baseband.View(), k, &b));
+        EXPECT_LE((a - b).cwiseAbs().maxCoeff(), 1e-4f * b.cwiseAbs().maxCoeff()) << "frame " << k;
+      }
+    }
+  }
+}
+
 // Verifies that every frame of a random sequence scores highest on the
 // symbol sent through a channel whose echoes are stronger than the direct
 // path, with the frame grid anchored on the direct path, on the strongest
