@@ -4,6 +4,7 @@
 #include <sndfile.h>
 
 #include <algorithm>
+#include <bit>
 #include <cerrno>
 #include <cmath>
 #include <cstring>
@@ -310,7 +311,11 @@ size_t SoundFileReader::Read(int16_t* to, size_t frames) {
   }
   if (encoding_ == Encoding::kSigned16) {
     const size_t got = ReadWavFrames(frames);
-    for (size_t i = 0; i < got * channels_; ++i) to[i] = static_cast<int16_t>(Le16(&bytes_[2 * i]));
+    if constexpr (std::endian::native == std::endian::little) {
+      std::memcpy(to, bytes_.data(), got * channels_ * sizeof(int16_t));
+    } else {
+      for (size_t i = 0; i < got * channels_; ++i) to[i] = static_cast<int16_t>(Le16(&bytes_[2 * i]));
+    }
     return got;
   }
   // Other encodings through the float conversion, rounded.
