@@ -32,6 +32,8 @@ AudioModemDecoder::AudioModemDecoder(std::unique_ptr<DtmfDecoder> dtmf_decoder)
 }
 
 void AudioModemDecoder::Initialize(int num_channels, float input_sample_rate) {
+  num_channels_ = num_channels;
+  input_sample_rate_ = input_sample_rate;
   switch (kind_) {
     case kDsss:
       dsss_decoder_->Initialize(num_channels, input_sample_rate);
@@ -76,6 +78,16 @@ void AudioModemDecoder::ProcessPcm16(const int16_t* samples, int count) {
   }
   float_samples_.assign(samples, samples + std::max(count, 0));
   ProcessSamples(float_samples_);
+}
+
+void AudioModemDecoder::FinishInput() {
+  constexpr double kSilenceSeconds = 0.5;
+  if (input_sample_rate_ <= 0.0f) return;  // not initialised: nothing buffered
+  // In 10 ms blocks, as audio arrives.
+  const int block_frames = std::max(1, static_cast<int>(input_sample_rate_ / 100));
+  const int frames = static_cast<int>(std::lround(kSilenceSeconds * input_sample_rate_));
+  float_samples_.assign(static_cast<size_t>(block_frames) * num_channels_, 0.0f);
+  for (int fed = 0; fed < frames; fed += block_frames) ProcessSamples(float_samples_);
 }
 
 void AudioModemDecoder::ProcessSamplesInt16(const int16_t* samples, int count) {

@@ -59,6 +59,12 @@ class AudioModemDecoder {
   void WipeInternalData();
   // Samples one call can take without cutting into a buffered token.
   int GetMaxSafeInputSize() const;
+  // The input has ended (a recording, a closed stream): feeds the half
+  // second of digital silence the decoders need to finish a broadcast the
+  // input ends with, since they score a frame only once they have heard a
+  // few frames past it. The next DecodeTokens then hears that broadcast;
+  // later input follows the silence.
+  void FinishInput();
 
   Kind kind() const { return kind_; }
   int token_length_bytes() const { return token_length_bytes_; }
@@ -69,6 +75,8 @@ class AudioModemDecoder {
   std::unique_ptr<HotsoundDecoder> hotsound_decoder_;
   Kind kind_;
   int token_length_bytes_ = 0;
+  int num_channels_ = 1;
+  float input_sample_rate_ = 0.0f;
   std::vector<int16_t> int16_samples_;
   std::vector<float> float_samples_;
   audio_sorvane::DecodeResults raw_;  // the decoder's results, reused per request

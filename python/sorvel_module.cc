@@ -331,6 +331,16 @@ class Decoder {
     return tokens;
   }
 
+  // The tokens of a recording that has ended, including a broadcast it
+  // ends with: the decoder hears half a second of silence first.
+  py::list Finish() {
+    {
+      py::gil_scoped_release release;
+      decoder_->FinishInput();
+    }
+    return Tokens();
+  }
+
   bool DetectBroadcaster() { return decoder_->DetectBroadcaster(); }
 
   void Reset() {
@@ -518,6 +528,11 @@ PYBIND11_MODULE(sorvel, m) {
            "A list of bytes: the message bytes of each distinct token heard\n"
            "since the last call and not reported before, best first per request.\n"
            "Without crc, lower-ranked candidates are alternatives nothing vouches for.")
+      .def("finish", &Decoder::Finish,
+           "tokens() at the end of a recording. The decoder scores a frame only\n"
+           "once it has heard a little past it, so a broadcast that ends the audio\n"
+           "is heard only after this call (which feeds it half a second of silence;\n"
+           "later audio follows that silence).")
       .def("detect_broadcaster", &Decoder::DetectBroadcaster,
            "dsss only: whether a broadcast is heard")
       .def("reset", &Decoder::Reset, "Forgets the audio and the tokens heard")

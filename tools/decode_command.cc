@@ -196,17 +196,8 @@ void StreamDecoder::Advance(int64_t frames) {
 }
 
 int StreamDecoder::Finish() {
-  // The decoders score a frame only once they have heard a few frames past
-  // it (the channel estimate averages neighbours, the noise floor is
-  // smoothed), so a broadcast that ends with the input would be cut off.
-  // Half a second of digital silence lets them finish, as a recording that
-  // went on would; the stream clock stays at the end of the input.
-  constexpr double kFlushSeconds = 0.5;
-  const size_t block = std::max<size_t>(1, static_cast<size_t>(rate_ / 100)) * channels_;
-  const std::vector<float> silence(block, 0.0f);
-  for (size_t fed = 0; fed < static_cast<size_t>(kFlushSeconds * rate_) * channels_; fed += block) {
-    decoder_->ProcessSamples(silence);
-  }
+  // The stream clock stays at the end of the input.
+  decoder_->FinishInput();
   Request(frames_ / static_cast<double>(rate_));
   return static_cast<int>(seen_.size());
 }

@@ -36,7 +36,8 @@ class StreamDecoder {
   void Feed(std::span<const float> samples);
   // Interleaved 16-bit samples.
   void FeedPcm16(std::span<const int16_t> samples);
-  // A last request; returns the number of distinct tokens found.
+  // Ends the input (AudioModemDecoder::FinishInput) and asks a last time;
+  // returns the number of distinct tokens found.
   int Finish();
   // Stream time of the first best-ranked token, or a negative value.
   double first_token_seconds() const { return first_token_seconds_; }

@@ -117,6 +117,13 @@ class JsDecoder {
     return heard;
   }
 
+  // At the end of a recording: the tokens a broadcast it ends with adds.
+  val Finish() {
+    val heard = val::array();
+    for (const std::string& token : decoder_.Finish()) heard.call<void>("push", token);
+    return heard;
+  }
+
   void Reset() { decoder_.Reset(); }
 
  private:
@@ -131,6 +138,7 @@ EMSCRIPTEN_BINDINGS(sorvel_web) {
       .constructor<>()
       .function("configure", &JsDecoder::Configure)
       .function("process", &JsDecoder::Process)
+      .function("finish", &JsDecoder::Finish)
       .function("reset", &JsDecoder::Reset);
 }
 

@@ -219,6 +219,17 @@ std::vector<std::string> WebDecoder::Process(std::span<const float> samples) {
   return heard;
 }
 
+std::vector<std::string> WebDecoder::Finish() {
+  std::vector<std::string> heard;
+  if (!decoder_) {
+    LOG(ERROR) << "the decoder is not configured";
+    return heard;
+  }
+  decoder_->FinishInput();
+  Request(&heard);
+  return heard;
+}
+
 void WebDecoder::Reset() {
   if (!decoder_) return;
   decoder_->WipeInternalData();

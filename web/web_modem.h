@@ -76,6 +76,11 @@ class WebDecoder {
   // first heard in this audio. Before Configure: logged, nothing decoded.
   std::vector<std::string> Process(std::span<const float> samples);
 
+  // The end of a recording: tokens first heard once the decoder has had the
+  // half second of silence that lets it finish a broadcast the audio ends
+  // with (AudioModemDecoder::FinishInput).
+  std::vector<std::string> Finish();
+
   // Drops buffered audio and the tokens already reported.
   void Reset();
 

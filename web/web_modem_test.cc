@@ -110,6 +110,22 @@ TEST_P(WebModemRoundTripTest, DecodesTheBroadcastOnce) {
   EXPECT_THAT(Listen(decoder, broadcast.samples), ElementsAre(message));
 }
 
+// Verifies that a recording holding one broadcast and nothing after it is
+// heard once the decoder is told the recording has ended.
+TEST_P(WebModemRoundTripTest, FinishHearsABroadcastThatEndsTheAudio) {
+  const auto& [scheme, crc, rate_hz] = GetParam();
+  const WebModemSettings s = Settings(scheme, crc, rate_hz);
+  const std::string message = scheme == "dsss" ? (crc ? "536f7276656c" : "536f7276656c2121")
+                                               : (crc ? "536f72" : "536f727665");
+  const EncodeResult broadcast = EncodeToken(s, message, 0.0);
+  ASSERT_EQ(broadcast.error, "");
+  WebDecoder decoder;
+  ASSERT_EQ(decoder.Configure(s), "");
+  std::vector<std::string> heard = Listen(decoder, broadcast.samples);
+  for (const std::string& token : decoder.Finish()) heard.push_back(token);
+  EXPECT_THAT(heard, ElementsAre(message));
+}
+
 INSTANTIATE_TEST_SUITE_P(SchemesAndRates, WebModemRoundTripTest,
                          ::testing::Combine(::testing::Values("dsss", "dtmf"),
                                             ::testing::Bool(),

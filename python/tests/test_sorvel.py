@@ -53,6 +53,15 @@ def test_round_trip(scheme, hotsound, crc, message):
         assert tokens and tokens[0] == message
 
 
+@pytest.mark.parametrize("scheme,hotsound", [("dsss", False), ("dsss", True), ("dtmf", False)])
+def test_finish_hears_a_broadcast_that_ends_the_recording(scheme, hotsound):
+    message = bytes.fromhex("536f7276656c" if scheme == "dsss" else "c0ffee")
+    enc = sorvel.Encoder(scheme, crc=True)
+    dec = sorvel.Decoder(scheme, crc=True, hotsound=hotsound, sample_rate=enc.sample_rate)
+    dec.process(enc.encode(message))
+    assert dec.finish() == [message]
+
+
 @pytest.mark.parametrize("scheme,channel", [
     ("dsss", dict(snr_db=0, noise="pink", rt60=0.3, seed=3)),
     ("dsss", dict(snr_db=5, room=(6, 5, 2.7), rt60=0.6, distance=2, source="phone", seed=4)),

@@ -180,6 +180,7 @@ test('the module answers bad arguments with messages, not exceptions', async () 
       loopType: modem.encode({crc: true}, message, 'x').error,
       good: modem.encode({crc: true, sampleRateHz: 48000}, message, 0).pcm16.length,
       unconfigured: decoder.process(new Float32Array(4096)).length,
+      unconfiguredFinish: decoder.finish().length,
       lowRate: decoder.configure({sampleRateHz: 22050}),
       notFloats: decoder.process([1, 2, 3]).length,
       // The buffer the block is copied into shrinks and grows with it.
@@ -196,6 +197,7 @@ test('the module answers bad arguments with messages, not exceptions', async () 
   assert.match(answers.loopType, /loop must be a number of seconds/);
   assert.ok(answers.good > 0);
   assert.equal(answers.unconfigured, 0);
+  assert.equal(answers.unconfiguredFinish, 0);
   assert.match(answers.lowRate, /22050 Hz rate cannot carry the 18500 Hz carrier/);
   assert.equal(answers.notFloats, 0);
   assert.equal(answers.short, 0);
