@@ -21,6 +21,9 @@ import java.util.concurrent.locks.ReentrantReadWriteLock;
  * }
  * }</pre>
  *
+ * <p>At the end of a recording, {@link #finish()} in place of {@code tokens()}
+ * also finds a broadcast the recording ends with.
+ *
  * <p>Audio is interleaved when there are several channels; a block must hold
  * whole frames (a multiple of the channel count), else {@link
  * IllegalArgumentException}. Blocks of any length are accepted: long ones are
@@ -55,6 +58,7 @@ public final class TokenDecoder implements AutoCloseable {
   private final int messageBytes;
   private final int crcBytes;
   private final int pieceSamples;  // most samples one native call takes
+  private final int finishSamples;  // the silence finish() feeds: half a second
   private ByteBuffer scratch;  // direct, native order; for arrays and heap buffers
   private ShortBuffer scratchShorts;
   private boolean closed;
@@ -89,6 +93,7 @@ public final class TokenDecoder implements AutoCloseable {
       REGISTRY.writeLock().unlock();
     }
     pieceSamples = Math.max(channels, safeBytes / 2 / channels * channels);
+    finishSamples = Math.round(0.5f * b.inputSampleRate) * channels;
   }
 
   private static boolean initialize(int id, Builder b) {
@@ -209,6 +214,18 @@ public final class TokenDecoder implements AutoCloseable {
       REGISTRY.readLock().unlock();
     }
     return results.tokens;
+  }
+
+  /**
+   * {@link #tokens()} at the end of a recording. The decoder scores a frame
+   * only once it has heard a little past it, so a broadcast the audio ends
+   * with is found only after this call, which feeds half a second of silence
+   * first (audio fed later follows that silence).
+   */
+  public synchronized List<byte[]> finish() {
+    checkOpen();
+    process(new short[finishSamples]);
+    return tokens();
   }
 
   /** Forgets the audio fed so far, as between two listening sessions. */

@@ -115,6 +115,23 @@ public class TokenCodecTest {
 
   // Refused blocks leave the decoder and the buffer as they were.
   @Test
+  public void finishFindsABroadcastThatEndsTheRecording() {
+    TokenEncoder dsssEncoder = new TokenEncoder(DsssSettings.defaults(), true);
+    TokenEncoder dtmfEncoder = new TokenEncoder(DtmfSettings.defaults(), true);
+    try (TokenDecoder dsss = TokenDecoder.builder(DsssSettings.defaults()).crc(true).build();
+        TokenDecoder dtmf = TokenDecoder.builder(DtmfSettings.defaults()).crc(true).build()) {
+      dsss.process(dsssEncoder.encode(SIX));
+      dtmf.process(dtmfEncoder.encode(THREE));
+      List<byte[]> dsssTokens = dsss.finish();
+      List<byte[]> dtmfTokens = dtmf.finish();
+      assertEquals(1, dsssTokens.size());
+      assertArrayEquals(SIX, dsssTokens.get(0));
+      assertEquals(1, dtmfTokens.size());
+      assertArrayEquals(THREE, dtmfTokens.get(0));
+    }
+  }
+
+  @Test
   public void refusedBlocksChangeNothing() {
     DsssSettings dsss = DsssSettings.defaults();
     short[] pcm = broadcast(new TokenEncoder(dsss, true), SIX);
@@ -156,6 +173,7 @@ public class TokenCodecTest {
         () -> decoder.process(ByteBuffer.allocateDirect(4)),
         () -> decoder.process(ByteBuffer.allocate(4)),
         decoder::tokens,
+        decoder::finish,
         decoder::wipe);
     for (Runnable call : calls) {
       assertThrows(IllegalStateException.class, call::run);
