@@ -96,34 +96,25 @@ TEST(WebModemEncodeTest, LoopCoversTheRequestedTime) {
 class WebModemRoundTripTest
     : public ::testing::TestWithParam<std::tuple<std::string, bool, int>> {};
 
-// Verifies that a looped broadcast encoded at the page's rate comes back
-// from the streaming decoder fed in render quanta, reported once.
+// Verifies that a broadcast encoded at the page's rate comes back from the
+// streaming decoder fed in render quanta, reported once: looped for 4 s,
+// or a single one that ends the recording, heard once Finish tells the
+// decoder the recording has ended.
 TEST_P(WebModemRoundTripTest, DecodesTheBroadcastOnce) {
   const auto& [scheme, crc, rate_hz] = GetParam();
   const WebModemSettings s = Settings(scheme, crc, rate_hz);
   const std::string message = scheme == "dsss" ? (crc ? "536f7276656c" : "536f7276656c2121")
                                                : (crc ? "536f72" : "536f727665");
-  const EncodeResult broadcast = EncodeToken(s, message, 4.0);
-  ASSERT_EQ(broadcast.error, "");
-  WebDecoder decoder;
-  ASSERT_EQ(decoder.Configure(s), "");
-  EXPECT_THAT(Listen(decoder, broadcast.samples), ElementsAre(message));
-}
-
-// Verifies that a recording holding one broadcast and nothing after it is
-// heard once the decoder is told the recording has ended.
-TEST_P(WebModemRoundTripTest, FinishHearsABroadcastThatEndsTheAudio) {
-  const auto& [scheme, crc, rate_hz] = GetParam();
-  const WebModemSettings s = Settings(scheme, crc, rate_hz);
-  const std::string message = scheme == "dsss" ? (crc ? "536f7276656c" : "536f7276656c2121")
-                                               : (crc ? "536f72" : "536f727665");
-  const EncodeResult broadcast = EncodeToken(s, message, 0.0);
-  ASSERT_EQ(broadcast.error, "");
-  WebDecoder decoder;
-  ASSERT_EQ(decoder.Configure(s), "");
-  std::vector<std::string> heard = Listen(decoder, broadcast.samples);
-  for (const std::string& token : decoder.Finish()) heard.push_back(token);
-  EXPECT_THAT(heard, ElementsAre(message));
+  for (double loop_seconds : {4.0, 0.0}) {
+    SCOPED_TRACE(loop_seconds);
+    const EncodeResult broadcast = EncodeToken(s, message, loop_seconds);
+    ASSERT_EQ(broadcast.error, "");
+    WebDecoder decoder;
+    ASSERT_EQ(decoder.Configure(s), "");
+    std::vector<std::string> heard = Listen(decoder, broadcast.samples);
+    for (const std::string& token : decoder.Finish()) heard.push_back(token);
+    EXPECT_THAT(heard, ElementsAre(message));
+  }
 }
 
 INSTANTIATE_TEST_SUITE_P(SchemesAndRates, WebModemRoundTripTest,
