@@ -149,13 +149,12 @@ TEST(FFTTransformerTest, LongNonFastRealTransform) {
 }
 
 #if GTEST_HAS_DEATH_TEST
-TEST(FFTTransformerDeathTest, RejectsWrongSizesAndNullPointers) {
+TEST(FFTTransformerDeathTest, RejectsWrongSizes) {
   EXPECT_DEATH(ComplexFFTTransformer(0, false), CheckFailed("size > 0"));
   ComplexFFTTransformer complex_fft(8, false);
   std::vector<Complex> out;
   EXPECT_DEATH(complex_fft.Inverse(std::vector<Complex>(9), &out),
                CheckFailed("input.size() == GetSize()"));
-  EXPECT_DEATH(complex_fft.Forward(nullptr, out.data()), CheckFailed("input"));
   RealFFTTransformer real_fft(8, false);
   std::vector<float> real_out;
   EXPECT_DEATH(real_fft.Inverse(std::vector<Complex>(8), &real_out),

@@ -117,13 +117,12 @@ TEST(BandPassFilterTest, SeparatesTonesOnBins) {
 }
 
 #if GTEST_HAS_DEATH_TEST
-TEST(KissFftUtilDeathTest, RejectsInvalidArguments) {
+// Empty inputs and band edges past the spectrum would index out of range.
+TEST(KissFftUtilDeathTest, RejectsEmptyInputsAndEdgesPastTheSpectrum) {
   const std::vector<Complex> spectrum(5);
   std::vector<Complex> out;
   EXPECT_DEATH(SpectralBandPassFilter({}, &out, 0, 1, 1),
                CheckFailed("!input_spectrum.empty()"));
-  EXPECT_DEATH(SpectralBandPassFilter(spectrum, nullptr, 0, 1, 1),
-               CheckFailed("output_spectrum != nullptr"));
   EXPECT_DEATH(SpectralBandPassFilter(spectrum, &out, 0, 5.5f, 1),
                CheckFailed("high_band_edge <= bin_width * spectrum_size"));
   const std::vector<float> signal(10);
@@ -133,9 +132,6 @@ TEST(KissFftUtilDeathTest, RejectsInvalidArguments) {
   EXPECT_DEATH(BandPassFilter(signal, &real_out, 0, 55, 100),
                CheckFailed("high_band_edge < sample_rate * (0.5f + 0.5f / "
                            "input.size())"));
-  EXPECT_DEATH(BandPassFilter(signal, nullptr, 0, 10, 100),
-               CheckFailed("output != nullptr"));
-  EXPECT_DEATH(FftResample(signal, nullptr, 100, 200), CheckFailed("output"));
 }
 #endif
 

@@ -20,19 +20,11 @@ std::vector<float> Max(const std::vector<float>& x, int window) {
   return y;
 }
 
-TEST(MaxFilterTest, KnownOutputs) {
-  EXPECT_THAT(Max({1, 5, 2, 0, 0, 3}, 3), ElementsAreArray({5, 5, 5, 2, 3, 3}));
-  EXPECT_THAT(Max({1, 5, 2, 0, 0, 3}, 1), ElementsAreArray({1, 5, 2, 0, 0, 3}));
-  // Even window: reaches one further back than ahead.
-  EXPECT_THAT(Max({4, 0, 0, 0, 1}, 2), ElementsAreArray({4, 4, 0, 0, 1}));
-  // Ties and a window wider than the signal.
-  EXPECT_THAT(Max({2, 2, 1}, 9), ElementsAreArray({2, 2, 2}));
-  MaxFilter(nullptr, 0, 3, nullptr);  // nothing to do, pointers not examined
-}
-
-// Verifies the monotonic queue against the definition over many shapes,
-// including decreasing runs that fill the queue.
+// Verifies the monotonic queue against the definition over many shapes:
+// ties, even windows (one further back than ahead), windows wider than the
+// signal, and decreasing runs that fill the queue.
 TEST(MaxFilterTest, MatchesDefinition) {
+  MaxFilter(nullptr, 0, 3, nullptr);  // nothing to do, pointers not examined
   std::mt19937 rng(3);
   std::uniform_int_distribution<int> level(-5, 5);
   for (int n = 1; n <= 20; ++n) {
@@ -57,8 +49,6 @@ TEST(MaxFilterTest, MatchesDefinition) {
 TEST(MaxFilterDeathTest, RejectsInvalidArguments) {
   float buffer[3] = {};
   EXPECT_DEATH(MaxFilter(buffer, -1, 3, buffer), CheckFailed("num_samples >= 0"));
-  EXPECT_DEATH(MaxFilter(nullptr, 3, 3, buffer), CheckFailed("input"));
-  EXPECT_DEATH(MaxFilter(buffer, 3, 3, nullptr), CheckFailed("output"));
 }
 #endif
 

@@ -62,10 +62,7 @@ TEST(MaxFilterResponseTest, PicksStrongestRowFirstOnTies) {
 }
 
 #if GTEST_HAS_DEATH_TEST
-TEST(SorvaneUtilDeathTest, RejectsInvalidArguments) {
-  std::vector<float> grid;
-  EXPECT_DEATH(FrequencyGrid(1.0f, 1.0f, nullptr), CheckFailed("frequencies"));
-  EXPECT_DEATH(PhasorMatrix(grid, 3, 1.0, nullptr), CheckFailed("phasor_matrix"));
+TEST(SorvaneUtilDeathTest, RejectsMismatchedSizes) {
   EXPECT_DEATH(MaxFilterResponse(audio_dsp::ComplexMatrix(2, 3),
                                  audio_dsp::ComplexVector(2)),
                CheckFailed("filter_matrix.cols() == signal.size()"));
