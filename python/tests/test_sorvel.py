@@ -148,7 +148,9 @@ PCM = np.zeros(4410, np.int16)
 PCM[::7] = 1000
 
 INVALID = [
-    # What is refused, the exception and a piece of its message.
+    # What is refused, the exception and a piece of its message: every
+    # keyword's value reaches the library's checks (whose bounds the C++
+    # tests cover), and what the module itself checks.
     (lambda: sorvel.Encoder("fsk"), ValueError, "scheme must be dsss or dtmf"),
     (lambda: sorvel.Encoder(number_of_taps=4), ValueError, "number_of_taps must be in [5, 11]"),
     (lambda: sorvel.Encoder(number_of_taps=5, code_number=3), ValueError, "code_number"),
@@ -164,21 +166,16 @@ INVALID = [
      "tone frequency 30000"),
     (lambda: sorvel.Encoder("dtmf", window_duration=0), ValueError, "window_duration must be positive"),
     (lambda: sorvel.Encoder("dtmf", adsr=[0.01, 0.01]), ValueError, "adsr takes 5 values"),
-    (lambda: sorvel.Encoder("dtmf", adsr=[1, 1, 1, 1, 0.5]), ValueError, "Nonzero duration 4 exceeds"),
     (lambda: sorvel.Encoder().encode(b"abc"), ValueError, "token has 3 bytes"),
     (lambda: sorvel.Encoder(crc=True).encode(bytes(8)), ValueError, "give 6 message bytes"),
     (lambda: sorvel.Encoder().encode(bytes(8), loop_seconds=-1), ValueError, "loop_seconds"),
-    (lambda: sorvel.Decoder(hotsound=True, sample_rate=32000), ValueError,
-     "hotsound needs a sample rate of at least"),
     (lambda: sorvel.Decoder("dtmf", hotsound=True, sample_rate=48000), ValueError,
      "hotsound works with the dsss scheme"),
-    (lambda: sorvel.Decoder(sample_rate=16000), ValueError, "cannot carry the 18500 Hz carrier"),
     (lambda: sorvel.Decoder(max_candidates=7), ValueError, "max_candidates must be in [1, 6]"),
     (lambda: sorvel.Decoder(channels=0), ValueError, "1 to 8 channels, got 0"),
     (lambda: sorvel.Decoder(sample_rate=float("nan")), ValueError, "input rate must be between"),
-    (lambda: sorvel.Decoder("dtmf", sample_rate=1.5), ValueError,
+    (lambda: sorvel.Decoder("dtmf", sample_rate=1e9), ValueError,
      "input rate must be between 8000 and 192000 Hz"),
-    (lambda: sorvel.Decoder("dtmf", sample_rate=1e9), ValueError, "input rate"),
     (lambda: sorvel.Decoder("dtmf", buffer_duration_factor=0), ValueError,
      "buffer_duration_factor"),
     (lambda: sorvel.Decoder(detection_duration=-1), ValueError, "detection_duration"),

@@ -134,12 +134,11 @@ test('bad settings show a message and leave the page working', async () => {
     await page.waitForFunction(() => !document.getElementById('send-error').hidden ||
                                      document.getElementById('send-info').textContent !== '');
   };
+  // The messages are the module's own (web_modem_test.cc covers them); here
+  // they must reach the page, the one from the page's script included.
   const cases = [
     {input: {token: '53zz72'}, message: /'z' is not a hex digit/},
-    {input: {token: '536f7'}, message: /odd number of hex digits/},
-    {input: {token: MESSAGE + '00'}, message: /give 6 message bytes \(the CRC adds 2\)/},
     {input: {token: MESSAGE, scheme: 'dtmf'}, message: /dtmf scheme sends 5-byte tokens, so give 3/},
-    {input: {token: MESSAGE, loop: '-2'}, message: /loop must be between 0 and 60 seconds/},
     {input: {token: MESSAGE, loop: 'x'}, message: /loop must be a number/},
   ];
   for (const {input, message} of cases) {

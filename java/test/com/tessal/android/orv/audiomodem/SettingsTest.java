@@ -40,24 +40,19 @@ public class SettingsTest {
   // Each of these would end the process in a native check (or leave the
   // API's ranges); the JVM surviving the table is part of the test. The
   // messages are the library's, as the CLI and the Python module give them.
+  // Every setter reaches the check of its own setting; the bounds the C++
+  // tests already refuse (modem_config_test.cc) are not repeated here.
   @Test
   public void refusedSettingsThrowWithTheLibrarysMessage() {
     List<Refused> table = List.of(
         refused("leave no message bytes", () -> dsss().tokenLengthBytes(0).build()),
-        refused("token bytes must be at most 64", () -> dsss().tokenLengthBytes(65).build()),
-        refused("number_of_taps", () -> dsss().numberOfTaps(4).build()),
         refused("number_of_taps", () -> dsss().numberOfTaps(12).build()),
         refused("code_number", () -> dsss().numberOfTaps(6).codeNumber(3).build()),
-        refused("code_number", () -> dsss().numberOfTaps(7).codeNumber(4).build()),
-        refused("bits_per_symbol", () -> dsss().bitsPerSymbol(3).build()),
         refused("bits_per_symbol", () -> dsss().bitsPerSymbol(16).build()),
-        refused("frame sample rate", () -> dsss().sampleRate(Float.NaN).build()),
         refused("frame sample rate", () -> dsss().sampleRate(7999f).build()),
         refused("frame sample rate", () -> dsss().sampleRate(192001f).build()),
         refused("upsampling_factor", () -> dsss().upsamplingFactor(0).build()),
-        refused("upsampling_factor", () -> dsss().upsamplingFactor(33).build()),
         refused("baseband_decimation_factor", () -> dsss().basebandDecimationFactor(0).build()),
-        refused("baseband_decimation_factor", () -> dsss().basebandDecimationFactor(4).build()),
         refused("carrier frequency",
             () -> dsss().desiredCarrierFrequency(Math.nextUp(22050f)).build()),
         refused("carrier frequency", () -> dsss().desiredCarrierFrequency(-1f).build()),
@@ -65,27 +60,19 @@ public class SettingsTest {
             () -> dsss().desiredCarrierFrequency(Float.NaN).build()),
         refused("min_cycles_per_frame", () -> dsss().minCyclesPerFrame(-1).build()),
         refused("max_candidates", () -> dsss().maxCandidatesToReturn(0).build()),
-        refused("max_candidates", () -> dsss().maxCandidatesToReturn(7).build()),
         refused("broadcast sample rate", () -> dsss().broadcastSampleRate(0).build()),
         refused("start_transition_duration", () -> dsss().startTransitionDuration(-0.001f).build()),
-        refused("start_transition_duration",
-            () -> dsss().startTransitionDuration(Float.POSITIVE_INFINITY).build()),
 
         refused("frame sample rate", () -> dtmf().sampleRate(0f).build()),
         refused("leave no message bytes", () -> dtmf().bytesInToken(0).build()),
         refused("baseband_decimation_factor", () -> dtmf().basebandDecimationFactor(0).build()),
-        refused("window_duration", () -> dtmf().windowDuration(0f).build()),
         refused("window_duration", () -> dtmf().windowDuration(Float.NaN).build()),
-        refused("window_duration", () -> dtmf().windowDuration(1.5f).build()),
-        // 0.0001 s * 44100 Hz / 16 rounds to no decimated sample.
-        refused("window_duration", () -> dtmf().windowDuration(0.0001f).build()),
         refused("tone frequency", () -> dtmf().toneFrequencies(1000f, 2000f, 22050f).build()),
         refused("tone frequency", () -> dtmf().toneFrequencies(-1f, 1000f, 2000f).build()),
         refused("tone frequency",
             () -> dtmf().toneFrequencies(Float.NaN, 1000f, 2000f).build()),
         refused("at most 32 tone frequencies", () -> dtmf().tonesPerSymbol(1).toneFrequencies(tones(33))
             .build()),
-        refused("used in pairs", () -> dtmf().tonesPerSymbol(3).build()),
         refused("tones_per_symbol", () -> dtmf().tonesPerSymbol(11).build()),
         // 2 tones give 2 single-tone symbols; 6 tones in threes give 20 > 15.
         refused("give 2 symbols", () -> dtmf().toneFrequencies(tones(2)).tonesPerSymbol(1)
@@ -101,8 +88,6 @@ public class SettingsTest {
         // The default window scales with the frame, so shorter frames keep working.
         refused("max_candidates",
             () -> dtmf().windowDuration(0.02f).maxCandidatesPerDecodeTokenCall(0).build()),
-        refused("max_candidates",
-            () -> dtmf().maxCandidatesPerDecodeTokenCall(7).build()),
 
         refused("leave no message bytes", () -> new TokenEncoder(dsss().tokenLengthBytes(2).build(), true)),
         refused("leave no message bytes", () -> new TokenEncoder(dtmf().bytesInToken(1).build(), true)),
@@ -114,8 +99,6 @@ public class SettingsTest {
             .build()),
         refused("hotsound needs a sample rate", () -> TokenDecoder.builder(DsssSettings.defaults())
             .inputSampleRate(40992.99f).hotsound(true).build()),
-        refused("hotsound needs a sample rate", () -> TokenDecoder.builder(DsssSettings.defaults())
-            .inputSampleRate(32000f).hotsound(true).build()),
         refused("hotsound works with DsssSettings",
             () -> TokenDecoder.builder(DtmfSettings.defaults()).hotsound(true).build()));
 

@@ -113,7 +113,6 @@ public class TokenCodecTest {
     }
   }
 
-  // Refused blocks leave the decoder and the buffer as they were.
   @Test
   public void finishFindsABroadcastThatEndsTheRecording() {
     TokenEncoder dsssEncoder = new TokenEncoder(DsssSettings.defaults(), true);
@@ -131,6 +130,7 @@ public class TokenCodecTest {
     }
   }
 
+  // Refused blocks leave the decoder and the buffer as they were.
   @Test
   public void refusedBlocksChangeNothing() {
     DsssSettings dsss = DsssSettings.defaults();
