@@ -299,6 +299,12 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
     code_re_[k + half_band_] = static_cast<float>(value.real());
     code_im_[k + half_band_] = static_cast<float>(value.imag());
   }
+  turned_code_re_ = code_re_;
+  turned_code_im_ = code_im_;
+  for (int i = 1; i < product_size_; i += 2) {
+    turned_code_re_[i] = -code_re_[i];
+    turned_code_im_[i] = -code_im_[i];
+  }
   code_power_.resize(product_size_);
   Powers(code_re_.data(), code_im_.data(), product_size_, code_power_.data());
 
@@ -427,12 +433,18 @@ void HotsoundDetector::ScoreWindow() {
     // Correlation powers in units of their mean.
     const float scale = kCarrierOffsets / total;
     int spread_row = 0;
+    // Odd windows start half a frame further into the code: their lags are
+    // turned back by half a frame (every odd input of the inverse transform
+    // negated), so that a broadcast keeps its lag from window to window.
+    const bool turned = windows_ % 2 == 1;
+    const float* code_re = (turned ? turned_code_re_ : code_re_).data();
+    const float* code_im = (turned ? turned_code_im_ : code_im_).data();
     for (int d = 0; d < kCarrierOffsets; ++d) {
       const bool half = kOffsetBins[d] != std::floor(kOffsetBins[d]);
       float* powers = families_[0].ring[slot].data() + d * families_[0].row + kPad;
       fft_.InverseProductPowers((half ? half_re_ : whole_re_).data() + start[d],
-                                (half ? half_im_ : whole_im_).data() + start[d], code_re_.data(),
-                                code_im_.data(), product_size_, scale, powers);
+                                (half ? half_im_ : whole_im_).data() + start[d], code_re, code_im,
+                                product_size_, scale, powers);
       if (kSpreadOffset[d]) {
         PoolSpread(powers, families_[1].ring[slot].data() + spread_row * families_[1].row + kPad);
         ++spread_row;

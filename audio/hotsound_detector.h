@@ -18,8 +18,8 @@
 // implies, which follows a moving phone) and takes the best track and
 // offset, for two statistics (single lags at every offset, and sums over
 // half a frame of lags at the whole-bin and outermost offsets) and two
-// lengths: the last kWindows windows (about 0.5 s, for a
-// quick wake) and the last kLongWindows (about 1 s, for weak broadcasts;
+// lengths: the last kWindows windows (0.37 s, for a quick wake) and the
+// last kLongWindows (0.8 s, for weak broadcasts;
 // updated every other window), each against its own threshold; 25.0 means
 // a broadcast. A long track is followed only when the short tracks show
 // that it could come near a wake (see kLongGate).
@@ -67,7 +67,12 @@ class HotsoundDetector {
   // carrier half a bin from every offset searched would lose 4 dB (a hand's
   // drift of 0.2 m/s did), a quarter of a bin loses 0.9 dB.
   static constexpr int kCarrierOffsets = 11;
-  static constexpr int kHopFrames = 3;  // frames from one window to the next
+  // Frames from one window to the next: four hops and a window fit in
+  // 0.5 s, so every broadcast gives the short track four whole windows
+  // within half a second of its start, wherever it starts in the hop. Each
+  // window starts half a frame further into the code than the one before;
+  // odd windows' lags are turned by half a frame to line up.
+  static constexpr double kHopFrames = 2.5;
   static constexpr int kWindows = 4;    // windows a score adds up
   static constexpr int kLongWindows = 8;  // ... and the slower, finer one
   // Long tracks are followed only where they could reach this fraction of
@@ -157,6 +162,9 @@ class HotsoundDetector {
   int half_band_ = 0;
   int product_size_ = 0;
   std::vector<float> code_re_, code_im_, code_power_;
+  // The code spectrum with every odd entry negated: the lags it gives are
+  // turned by half a frame.
+  std::vector<float> turned_code_re_, turned_code_im_;
   audio_dsp::Radix4Fft fft_;
   bool wide_steps_;
 

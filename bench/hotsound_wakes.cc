@@ -210,7 +210,8 @@ int Duty(double minutes) {
 }
 
 // Wake times over `seeds` broadcasts (random messages looped from random
-// points, each after a second of the channel's noise) through `channel`
+// points, each after a second of the channel's noise and a random part of
+// the detector's hop, so that windows fall anywhere) through `channel`
 // (its seed varied per broadcast): the share woken within 0.5 s of the
 // broadcast's start, the median latency and the median peak score in that
 // half second, and how many of the broadcasts that a plain DSSS decoder fed
@@ -234,11 +235,12 @@ WakeStats MeasureWakes(audio_sorvane::AudioModemEncoder& encoder, sorvel_sim::Ch
     std::vector<float> loop = sorvel_sim::RenderLoopedBroadcast(encoder, token, 3.0);
     loop.erase(loop.begin(), loop.begin() + std::uniform_int_distribution<size_t>(0, token.size())(rng));
     loop.resize(static_cast<size_t>(2.5 * kRate));  // room for a whole token after any start
-    channel.leading_silence = 1.0;
+    const size_t begin = static_cast<size_t>(kRate) +
+                         std::uniform_int_distribution<size_t>(0, 3 * 1905 - 1)(rng);
+    channel.leading_silence = static_cast<double>(begin) / kRate;
     channel.seed = 500ULL + s;
     std::vector<int16_t> pcm = ToPcm(sorvel_sim::ApplyChannel(loop, channel));
     auto detector = audio_sorvane::MakeHotsoundDetector(44100, 1);
-    const size_t begin = static_cast<size_t>(kRate);
     double t = INFINITY;
     float best = 0.0f;
     for (size_t start = 0; start < pcm.size(); start += 441) {
