@@ -346,7 +346,7 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
     f.short_tracks.assign(kLongWindows, std::vector<float>(offsets * f.row, 0.0f));
     f.short_best.assign(kLongWindows, 0.0f);
   }
-  for (auto* v : {&track_a_, &track_b_, &track_c_}) v->assign(kCarrierOffsets * families_[0].row, 0.0f);
+  for (auto* v : {&track_a_, &track_b_, &track_c_}) v->assign(families_[0].row, 0.0f);
   static_assert(kSpreadStride == 4 && kN % 16 == 0 && kSpreadLags % 16 == 0);
   pooled_.resize(kN);
 }
@@ -463,11 +463,16 @@ void HotsoundDetector::ScoreWindow() {
 void HotsoundDetector::PoolSpread(const float* powers, float* out) {
   using audio_dsp::Float4;
   using audio_dsp::Load4;
-  // pooled_[j]: the sum of kSpreadStride consecutive lags from j * stride,
-  // with kSpreadLags lags of cyclic continuation; then sums of four of those
-  // in a row; then each output adds every fourth of the latter.
+  // pooled[j]: the sum of kSpreadStride consecutive lags from j * stride.
+  // An output adds kGroups of those from j on (cyclically): split at the
+  // block of kGroups that j falls in, it is the rest of j's block plus the
+  // start of the next, i.e. the block's total less its sums before j, plus
+  // the next block's sums before j. Sums before each entry are taken per
+  // block, so rounding never spans more than one block.
   constexpr int kLags = kN / kSpreadStride;
   constexpr int kGroups = kSpreadLags / kSpreadStride;
+  constexpr int kBlocks = kLags / kGroups;
+  static_assert(kLags % kGroups == 0 && kGroups % 4 == 0);
   float* pooled = pooled_.data();
   for (int t = 0; t < kN; t += 16) {
     Float4 a = Load4(powers + t), b = Load4(powers + t + 4), c = Load4(powers + t + 8),
@@ -475,16 +480,29 @@ void HotsoundDetector::PoolSpread(const float* powers, float* out) {
     audio_dsp::Transpose4(a, b, c, e);
     audio_dsp::Store4(pooled + t / 4, (a + b) + (c + e));
   }
-  std::copy(pooled, pooled + kGroups, pooled + kLags);
-  float* quads = pooled + kLags + kGroups;  // kLags + kGroups - 4 sums of four groups
-  for (int j = 0; j < kLags + kGroups - 4; j += 4) {
-    audio_dsp::Store4(quads + j, (Load4(pooled + j) + Load4(pooled + j + 1)) +
-                                     (Load4(pooled + j + 2) + Load4(pooled + j + 3)));
+  float* before = pooled + kLags;  // per entry, its block's sums before it
+  float totals[kBlocks];
+  for (int block = 0; block < kBlocks; ++block) {
+    Float4 carry = {};
+    for (int j = block * kGroups; j < (block + 1) * kGroups; j += 4) {
+      const Float4 x = Load4(pooled + j);
+      // Inclusive running sums of the four lanes, then of the block.
+      Float4 run = x + __builtin_shufflevector(x, Float4{}, 4, 0, 1, 2);
+      run += __builtin_shufflevector(run, Float4{}, 4, 4, 0, 1);
+      run += carry;
+      audio_dsp::Store4(before + j, run - x);
+      carry = audio_dsp::Splat4(run[3]);
+    }
+    totals[block] = carry[0];
   }
-  for (int j = 0; j < kLags; j += 4) {
-    Float4 sum = {};
-    for (int k = 0; k < kGroups; k += 4) sum += Load4(quads + j + k);
-    audio_dsp::Store4(out + j, sum);
+  for (int block = 0; block < kBlocks; ++block) {
+    const int next = (block + 1) % kBlocks;
+    const Float4 total = audio_dsp::Splat4(totals[block]);
+    for (int k = 0; k < kGroups; k += 4) {
+      audio_dsp::Store4(out + block * kGroups + k,
+                        total - Load4(before + block * kGroups + k) +
+                            Load4(before + next * kGroups + k));
+    }
   }
 }
 
@@ -521,9 +539,8 @@ void HotsoundDetector::Condition(const float* spec_re, const float* spec_im, flo
   // lag profiles that the spread statistic would take for a room. Noise and
   // the code rarely get there.
   const float ceiling = kMaxBinPower * band_mean;
-  float gains[kN], amplitudes[kN];  // per centred bin: its block's power and amplitude gain
+  float gains[kN];  // per centred bin: its block's power gain
   std::fill(gains + width, gains + (width + 3) / 4 * 4, 0.0f);
-  std::fill(amplitudes + width, amplitudes + (width + 3) / 4 * 4, 0.0f);
   for (int lo = -half_band; lo < half_band; lo += kWhiteningBlock) {
     const int first = lo == -half_band ? -reach : lo;
     const int last = lo + kWhiteningBlock >= half_band ? reach : lo + kWhiteningBlock - 1;
@@ -531,13 +548,14 @@ void HotsoundDetector::Condition(const float* spec_re, const float* spec_im, flo
     // A block without power stays as it is (zero).
     const float gain = block > 0.0f ? band_mean * static_cast<float>(last - first + 1) / block : 1.0f;
     std::fill(gains + (first + reach), gains + (last + reach + 1), gain);
-    std::fill(amplitudes + (first + reach), amplitudes + (last + reach + 1), std::sqrt(gain));
   }
+  // A bin's power after its gain is p gain, or the ceiling where that is
+  // higher: the amplitude gain is the root of the lesser of gain and
+  // ceiling / p (the comparison keeps the gain where p is zero).
   for (int i = 0; i < width; i += 4) {
     const Float4 gain = audio_dsp::Load4(gains + i);
-    const Float4 p = audio_dsp::Load4(power + i) * gain;
-    const Float4 clipped = audio_dsp::Sqrt4(gain * ceiling / p);  // used only where p > ceiling
-    const Float4 g = p > ceiling ? clipped : audio_dsp::Load4(amplitudes + i);
+    const Float4 clipped = ceiling / audio_dsp::Load4(power + i);
+    const Float4 g = audio_dsp::Sqrt4(clipped < gain ? clipped : gain);
     audio_dsp::Store4(out_re + i, audio_dsp::Load4(out_re + i) * g);
     audio_dsp::Store4(out_im + i, audio_dsp::Load4(out_im + i) * g);
   }
@@ -547,32 +565,32 @@ float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
   // The short track over the last kWindows windows starts from the oldest
   // window's row; the long one extends the short track that ended kWindows
   // windows ago by the same windows (on every other window: it is for
-  // broadcasts that take a second). Each step writes the other buffer of a
-  // pair; the short track's pair is arranged so that its last step lands in
-  // the slot's track.
+  // broadcasts that take a second). One carrier offset at a time, through
+  // two scratch rows, so that a track's steps stay in the first-level cache.
   const int first = (newest + kLongWindows - kWindows + 1) % kLongWindows;
   static_assert(kWindows >= 2);
-  float* const short_track = f.short_tracks[newest].data();
-  constexpr bool kOddSteps = (kWindows - 1) % 2 == 1;
-  float* const short_rows[2] = {kOddSteps ? track_a_.data() : short_track,
-                                kOddSteps ? short_track : track_a_.data()};
   const int older_slot = (first + kLongWindows - 1) % kLongWindows;
   const int offsets = static_cast<int>(f.offsets.size());
+  float* const scratch[2] = {track_a_.data(), track_b_.data()};
+  // Runs the steps over windows first + k0 .. newest from `start`, ending in
+  // `end`; returns the lane-wise maximum of the last step.
+  const auto follow = [&](int d, int k0, float* start, float* end) {
+    const int row = d * f.row;
+    float* from = start;
+    for (int k = k0; k < kWindows - 1; ++k) {
+      float* const to = scratch[k % 2];
+      ExtendTrack<false>(f, from, to, f.ring[(first + k) % kLongWindows].data() + row + kPad,
+                         f.drift[d]);
+      from = to;
+    }
+    return ExtendTrack<true>(f, from, end, f.ring[newest].data() + row + kPad, f.drift[d]);
+  };
   // The last step's outputs give each track's best sum.
   audio_dsp::Float4 short_top = {};
-  for (int k = 1; k < kWindows; ++k) {
-    const int slot = (first + k) % kLongWindows;
-    const bool last = k == kWindows - 1;
-    for (int d = 0; d < offsets; ++d) {
-      const int row = d * f.row;
-      float* const from = k == 1 ? f.ring[first].data() + row : short_rows[(k - 1) % 2] + row;
-      const float* e = f.ring[slot].data() + row + kPad;
-      if (last) {
-        short_top = Max(short_top, ExtendTrack<true>(f, from, short_rows[k % 2] + row, e, f.drift[d]));
-      } else {
-        ExtendTrack<false>(f, from, short_rows[k % 2] + row, e, f.drift[d]);
-      }
-    }
+  for (int d = 0; d < offsets; ++d) {
+    const int row = d * f.row;
+    short_top = Max(short_top, follow(d, 1, f.ring[first].data() + row,
+                                      f.short_tracks[newest].data() + row));
   }
   f.short_best[newest] = audio_dsp::MaxLane4(short_top);
   // Noise sums to f.pool per window on average; scores count from there,
@@ -589,22 +607,10 @@ float HotsoundDetector::UpdateTracks(Family& f, int newest, bool update_long) {
   if (update_long && long_score(f.short_best[older_slot] + f.short_best[newest]) < kLongGate) {
     f.long_score = 0.0f;
   } else if (update_long) {
-    float* const older = f.short_tracks[older_slot].data();
-    float* const long_rows[2] = {track_b_.data(), track_c_.data()};
     audio_dsp::Float4 long_top = {};
-    for (int k = 0; k < kWindows; ++k) {
-      const int slot = (first + k) % kLongWindows;
-      for (int d = 0; d < offsets; ++d) {
-        const int row = d * f.row;
-        float* const from = k == 0 ? older + row : long_rows[k % 2] + row;
-        float* const to = long_rows[(k + 1) % 2] + row;
-        const float* e = f.ring[slot].data() + row + kPad;
-        if (k == kWindows - 1) {
-          long_top = Max(long_top, ExtendTrack<true>(f, from, to, e, f.drift[d]));
-        } else {
-          ExtendTrack<false>(f, from, to, e, f.drift[d]);
-        }
-      }
+    for (int d = 0; d < offsets; ++d) {
+      long_top = Max(long_top, follow(d, 0, f.short_tracks[older_slot].data() + d * f.row,
+                                      track_c_.data()));
     }
     f.long_score = long_score(audio_dsp::MaxLane4(long_top));
   }

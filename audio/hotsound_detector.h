@@ -180,7 +180,7 @@ class HotsoundDetector {
   Family families_[2];
   int ring_next_ = 0;          // the slot the next window goes to
   std::vector<float> pooled_;  // PoolSpread's partial sums
-  // Track rows being built (kCarrierOffsets rows of the widest family).
+  // Scratch rows of a track being built (rows of the widest family).
   std::vector<float> track_a_, track_b_, track_c_;
   float score_ = 0.0f;
 };

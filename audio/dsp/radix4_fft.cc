@@ -64,6 +64,22 @@ inline __attribute__((always_inline)) void Butterfly(Complex& a0, Complex& a1, C
   a3 = {t1.re - t3.re, t1.im - t3.im};
 }
 
+// Butterfly when a2 and a3 are zero (an input zero past the first half).
+template <typename Complex>
+inline __attribute__((always_inline)) void HalfButterfly(Complex& a0, Complex& a1, Complex& a2, Complex& a3) {
+  a2 = {a0.re - a1.re, a0.im - a1.im};
+  a3 = {a0.re - a1.im, a0.im + a1.re};
+  const Complex t1{a0.re + a1.im, a0.im - a1.re};  // a0 - i a1
+  a0 = {a0.re + a1.re, a0.im + a1.im};
+  a1 = t1;
+}
+
+// Whether the first stage's inputs from the second half on are zero: a
+// product on no more than half the bins.
+inline bool SecondHalfZero(const Radix4Fft::Product* product, int size) {
+  return product != nullptr && product->n <= size / 2;
+}
+
 // Where stage `ns` of a transform of `size` writes: the output after the
 // last stage, else whichever scratch pair the previous stage did not.
 inline __attribute__((always_inline)) void StageDestination(int ns, int size, const float* src_re,
@@ -108,11 +124,17 @@ SORVEL_MULTIVERSION void Transform(int size, const float* w, const float* re, co
   // 4 j + r (a transpose of each group of four butterflies).
   float* dst_re = a_re;
   float* dst_im = a_im;
+  const bool half_zero = SecondHalfZero(product, size);
   for (int j = 0; j < quarter; j += 4) {
     Complex4 a0 = FirstInput(re, im, product, j), a1 = FirstInput(re, im, product, j + quarter);
-    Complex4 a2 = FirstInput(re, im, product, j + 2 * quarter);
-    Complex4 a3 = FirstInput(re, im, product, j + 3 * quarter);
-    Butterfly(a0, a1, a2, a3);
+    Complex4 a2, a3;
+    if (half_zero) {
+      HalfButterfly(a0, a1, a2, a3);
+    } else {
+      a2 = FirstInput(re, im, product, j + 2 * quarter);
+      a3 = FirstInput(re, im, product, j + 3 * quarter);
+      Butterfly(a0, a1, a2, a3);
+    }
     Transpose4(a0.re, a1.re, a2.re, a3.re);
     Transpose4(a0.im, a1.im, a2.im, a3.im);
     Store(dst_re, dst_im, 4 * j, a0);
@@ -211,12 +233,18 @@ SORVEL_WIDE void TransformWide(int size, const float* w, const float* re, const 
   const int quarter = size / 4;
   float* dst_re = a_re;
   float* dst_im = a_im;
+  const bool half_zero = SecondHalfZero(product, size);
   for (int j = 0; j < quarter; j += 8) {
     ComplexWide a0 = FirstInputWide(re, im, product, j);
     ComplexWide a1 = FirstInputWide(re, im, product, j + quarter);
-    ComplexWide a2 = FirstInputWide(re, im, product, j + 2 * quarter);
-    ComplexWide a3 = FirstInputWide(re, im, product, j + 3 * quarter);
-    Butterfly(a0, a1, a2, a3);
+    ComplexWide a2, a3;
+    if (half_zero) {
+      HalfButterfly(a0, a1, a2, a3);
+    } else {
+      a2 = FirstInputWide(re, im, product, j + 2 * quarter);
+      a3 = FirstInputWide(re, im, product, j + 3 * quarter);
+      Butterfly(a0, a1, a2, a3);
+    }
     // Lane l's four outputs go to 4 (j + l) .. 4 (j + l) + 3.
     TransposeHalves(a0.re, a1.re, a2.re, a3.re);
     TransposeHalves(a0.im, a1.im, a2.im, a3.im);

@@ -48,8 +48,8 @@ TEST(Radix4FftTest, MatchesGeneralTransform) {
 }
 
 // The fused correlation powers against an explicit product, inverse and
-// powers, for products that fill all, part or none of the bins, on both
-// paths.
+// powers, for products that fill all, more than half, half (the first
+// stage then skips the zero half) or none of the bins, on both paths.
 TEST(Radix4FftTest, InverseProductPowersMatchesExplicitSteps) {
   std::mt19937 rng(7);
   std::normal_distribution<float> normal;
@@ -58,7 +58,7 @@ TEST(Radix4FftTest, InverseProductPowersMatchesExplicitSteps) {
     for (auto* v : {&x_re, &x_im, &y_re, &y_im}) {
       for (float& f : *v) f = normal(rng);
     }
-    for (int n : {size, size * 11 / 16 / 8 * 8, 0}) {
+    for (int n : {size, size * 11 / 16 / 8 * 8, size / 2, 0}) {
       std::vector<std::complex<float>> product(size), lags(size);
       for (int i = 0; i < n; ++i) product[i] = std::complex(x_re[i], x_im[i]) * std::complex(y_re[i], y_im[i]);
       ComplexFFTTransformer(size, /*normalize_inverse=*/false).Inverse(product.data(), lags.data());
