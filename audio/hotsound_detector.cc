@@ -99,34 +99,29 @@ using Taps8 = audio_dsp::Float8;
 #define FOLD_TAPS8(v) ((v).lo + (v).hi)
 #endif
 
-// Mixes a window down: each of kN baseband samples is the dot product of
-// `taps` input samples from tap_start[m] with its complex taps (rows of
-// taps_re and taps_im). Returns the baseband's power and largest sample
-// power.
+// Mixes a window down: baseband sample m is the dot product of `taps` input
+// samples from tap_start[m] with the complex taps (tap_cos, tap_sin), times
+// the carrier's phase at tap_start[m] (rotation_re, rotation_im). Returns
+// the baseband's power and largest sample power.
 SORVEL_MULTIVERSION void MixWindow(const float* window, const int* tap_start,
-                                   const float* taps_re, const float* taps_im, int taps,
+                                   const float* tap_cos, const float* tap_sin, int taps,
+                                   const float* rotation_re, const float* rotation_im,
                                    float* base_re, float* base_im, float* energy, float* peak) {
-  // Four baseband samples at a time, their tap sums reduced together.
+  // Four baseband samples at a time: each load of the taps serves four
+  // samples, and their eight chains of multiply-adds run side by side.
   using audio_dsp::Float4;
   using audio_dsp::Load4;
   Float4 total = {}, top = {};
   for (int m = 0; m < kN; m += 4) {
-    // The four samples' sums advance together: eight independent chains of
-    // multiply-adds instead of two at a time.
     const float* x[4];
-    const float* tr[4];
-    const float* ti[4];
-    for (int j = 0; j < 4; ++j) {
-      x[j] = window + tap_start[m + j];
-      tr[j] = taps_re + static_cast<size_t>(m + j) * taps;
-      ti[j] = taps_im + static_cast<size_t>(m + j) * taps;
-    }
+    for (int j = 0; j < 4; ++j) x[j] = window + tap_start[m + j];
     Taps8 r[4] = {}, i[4] = {};
     for (int t = 0; t < taps; t += 8) {
+      const Taps8 c = LOAD_TAPS8(tap_cos + t), s = LOAD_TAPS8(tap_sin + t);
       for (int j = 0; j < 4; ++j) {
         const Taps8 xv = LOAD_TAPS8(x[j] + t);
-        r[j] += xv * LOAD_TAPS8(tr[j] + t);
-        i[j] += xv * LOAD_TAPS8(ti[j] + t);
+        r[j] += xv * c;
+        i[j] += xv * s;
       }
     }
     Float4 re[4], im[4];
@@ -138,9 +133,11 @@ SORVEL_MULTIVERSION void MixWindow(const float* window, const int* tap_start,
     audio_dsp::Transpose4(im[0], im[1], im[2], im[3]);
     const Float4 sr = (re[0] + re[1]) + (re[2] + re[3]);
     const Float4 si = (im[0] + im[1]) + (im[2] + im[3]);
-    audio_dsp::Store4(base_re + m, sr);
-    audio_dsp::Store4(base_im + m, si);
-    const Float4 power = sr * sr + si * si;
+    const Float4 wr = Load4(rotation_re + m), wi = Load4(rotation_im + m);
+    const Float4 br = sr * wr - si * wi, bi = sr * wi + si * wr;
+    audio_dsp::Store4(base_re + m, br);
+    audio_dsp::Store4(base_im + m, bi);
+    const Float4 power = br * br + bi * bi;
     total += power;
     top = audio_dsp::Max4(top, power);
   }
@@ -254,30 +251,33 @@ HotsoundDetector::HotsoundDetector(const HotsoundDetectorConfig& config, int ste
   hop_samples_ = static_cast<int>(std::lround(kHopFrames * frame));
 
   taps_ = 8 * static_cast<int>(std::ceil(kTapsPerSample * spacing / 8.0));
-  tap_start_.resize(kN);
-  taps_re_.resize(static_cast<size_t>(kN) * taps_);
-  taps_im_.resize(taps_re_.size());
+  // One low-pass filter for every baseband sample, centred between its
+  // middle two taps: each sample reads the taps_ input samples around its
+  // time rounded to the nearest input sample. That moves it by at most half
+  // an input sample, under a twenty-fifth of a chip at any rate the band
+  // fits (a chip spans 15 samples at 44.1 kHz), which the correlation does
+  // not notice; in return one load of the shared taps serves many samples.
   const double half = taps_ / 2.0;
+  const double middle = (taps_ - 1) / 2.0;
   const double w = 2.0 * std::numbers::pi * config_.frequency / rate;
   const double cutoff = kCutoffHz / rate;  // cycles per input sample
   std::vector<double> h(taps_);
+  double sum = 0.0;
+  for (int t = 0; t < taps_; ++t) {
+    const double u = t - middle;
+    const double x = 2.0 * cutoff * u;
+    h[t] = std::sin(std::numbers::pi * x) / (std::numbers::pi * x) * Blackman(u / half);
+    sum += h[t];
+  }
+  for (int t = 0; t < taps_; ++t) {
+    tap_cos_.push_back(static_cast<float>(h[t] / sum * std::cos(w * t)));
+    tap_sin_.push_back(static_cast<float>(-h[t] / sum * std::sin(w * t)));
+  }
   for (int m = 0; m < kN; ++m) {
-    const double centre = half + m * spacing;
-    const int start = static_cast<int>(std::floor(centre - half)) + 1;
-    tap_start_[m] = start;
-    double sum = 0.0;
-    for (int t = 0; t < taps_; ++t) {
-      const double u = start + t - centre;
-      const double x = 2.0 * cutoff * u;
-      const double sinc = u == 0.0 ? 1.0 : std::sin(std::numbers::pi * x) / (std::numbers::pi * x);
-      h[t] = std::abs(u) < half ? sinc * Blackman(u / half) : 0.0;
-      sum += h[t];
-    }
-    for (int t = 0; t < taps_; ++t) {
-      const double phase = w * (start + t);
-      taps_re_[static_cast<size_t>(m) * taps_ + t] = static_cast<float>(h[t] / sum * std::cos(phase));
-      taps_im_[static_cast<size_t>(m) * taps_ + t] = static_cast<float>(-h[t] / sum * std::sin(phase));
-    }
+    const int start = static_cast<int>(std::lround(half + m * spacing - middle));
+    tap_start_.push_back(start);
+    rotation_re_.push_back(static_cast<float>(std::cos(w * start)));
+    rotation_im_.push_back(static_cast<float>(-std::sin(w * start)));
   }
   window_size_ = tap_start_[kN - 1] + taps_;
   CHECK(hop_samples_ >= window_size_);
@@ -392,8 +392,9 @@ float HotsoundDetector::Process(std::span<const int16_t> samples) {
 }
 
 void HotsoundDetector::MixDown(float* energy, float* peak) {
-  MixWindow(window_.data(), tap_start_.data(), taps_re_.data(), taps_im_.data(), taps_,
-            base_re_.data(), base_im_.data(), energy, peak);
+  MixWindow(window_.data(), tap_start_.data(), tap_cos_.data(), tap_sin_.data(), taps_,
+            rotation_re_.data(), rotation_im_.data(), base_re_.data(), base_im_.data(), energy,
+            peak);
 }
 
 void HotsoundDetector::ScoreWindow() {

@@ -150,10 +150,12 @@ class HotsoundDetector {
   int window_size_ = 0;  // input samples one window reads
   int hop_samples_ = 0;
   int taps_ = 0;         // filter taps per baseband sample, a multiple of 8
-  // Per baseband sample: first input sample, and taps_ real and imaginary
-  // coefficients of the mixing low-pass filter.
+  // The low-pass filter's taps_ coefficients, mixed down from the carrier
+  // (real and imaginary parts); per baseband sample, the first input sample
+  // it reads and the carrier's phase there.
+  std::vector<float> tap_cos_, tap_sin_;
   std::vector<int> tap_start_;
-  std::vector<float> taps_re_, taps_im_;
+  std::vector<float> rotation_re_, rotation_im_;
   // Spectra are kept centred on the carrier: entry kMaxShift + half_band_
   // + f holds bin f, for |f| <= half_band_ + kMaxShift (the bins the carrier
   // offsets read). conj(code spectrum) on bins -half_band_..half_band_ from
