@@ -145,6 +145,11 @@ SORVEL_MULTIVERSION void MixWindow(const float* window, const int* tap_start,
   *peak = audio_dsp::MaxLane4(top);
 }
 
+// out[i] = x[i] for n samples (eight at a time in the AVX2 clones).
+SORVEL_MULTIVERSION void ToFloat(const int16_t* x, size_t n, float* out) {
+  for (size_t i = 0; i < n; ++i) out[i] = x[i];
+}
+
 // The products' total power over all carrier offsets: sum over offsets d
 // and bins i < n (a multiple of four) of the spectrum's power at start[d] + i
 // (in `half` or `whole`, as offset d reads) times the code's at i.
@@ -371,7 +376,7 @@ float HotsoundDetector::Process(std::span<const int16_t> samples) {
     const size_t take = std::min<size_t>(window_size_ - fill_, count - i);
     float* out = window_.data() + fill_;
     if (step == 1) {
-      std::copy(samples.begin() + i, samples.begin() + i + take, out);
+      ToFloat(samples.data() + i, take, out);
     } else {
       for (size_t j = 0; j < take; ++j) {
         const size_t at = (i + j) * step;
@@ -540,23 +545,24 @@ void HotsoundDetector::Condition(const float* spec_re, const float* spec_im, flo
   // lag profiles that the spread statistic would take for a room. Noise and
   // the code rarely get there.
   const float ceiling = kMaxBinPower * band_mean;
-  float gains[kN];  // per centred bin: its block's power gain
-  std::fill(gains + width, gains + (width + 3) / 4 * 4, 0.0f);
+  float amplitudes[kN];  // per centred bin: its block's amplitude gain
+  std::fill(amplitudes + width, amplitudes + (width + 3) / 4 * 4, 0.0f);
   for (int lo = -half_band; lo < half_band; lo += kWhiteningBlock) {
     const int first = lo == -half_band ? -reach : lo;
     const int last = lo + kWhiteningBlock >= half_band ? reach : lo + kWhiteningBlock - 1;
     const float block = Sum(power + (first + reach), last - first + 1);
     // A block without power stays as it is (zero).
     const float gain = block > 0.0f ? band_mean * static_cast<float>(last - first + 1) / block : 1.0f;
-    std::fill(gains + (first + reach), gains + (last + reach + 1), gain);
+    std::fill(amplitudes + (first + reach), amplitudes + (last + reach + 1), std::sqrt(gain));
   }
-  // A bin's power after its gain is p gain, or the ceiling where that is
-  // higher: the amplitude gain is the root of the lesser of gain and
-  // ceiling / p (the comparison keeps the gain where p is zero).
+  // A bin whose power p would exceed the ceiling after its block's gain is
+  // scaled to the ceiling instead, by sqrt(ceiling / p): the lesser of the
+  // two amplitude gains (the comparison keeps the block's where p is zero).
+  const Float4 root_ceiling = audio_dsp::Splat4(std::sqrt(ceiling));
   for (int i = 0; i < width; i += 4) {
-    const Float4 gain = audio_dsp::Load4(gains + i);
-    const Float4 clipped = ceiling / audio_dsp::Load4(power + i);
-    const Float4 g = audio_dsp::Sqrt4(clipped < gain ? clipped : gain);
+    const Float4 amplitude = audio_dsp::Load4(amplitudes + i);
+    const Float4 clipped = root_ceiling * audio_dsp::Rsqrt4(audio_dsp::Load4(power + i));
+    const Float4 g = clipped < amplitude ? clipped : amplitude;
     audio_dsp::Store4(out_re + i, audio_dsp::Load4(out_re + i) * g);
     audio_dsp::Store4(out_im + i, audio_dsp::Load4(out_im + i) * g);
   }

@@ -43,14 +43,22 @@ inline void Transpose4(Float4& a, Float4& b, Float4& c, Float4& d) {
   d = __builtin_shufflevector(t2, t3, 2, 3, 6, 7);
 }
 
-// Lane-wise square root (one instruction on SSE and AArch64 NEON).
-inline Float4 Sqrt4(Float4 v) {
+// Lane-wise 1 / sqrt(v), to within a few units in the last place: the
+// processor's estimate refined by Newton steps (no division). Lanes of zero
+// give NaN or infinity; compare so that those lose.
+inline Float4 Rsqrt4(Float4 v) {
 #if defined(__SSE__)
-  return reinterpret_cast<Float4>(_mm_sqrt_ps(reinterpret_cast<__m128>(v)));
+  const Float4 y = reinterpret_cast<Float4>(_mm_rsqrt_ps(reinterpret_cast<__m128>(v)));
+  return y * (Float4{1.5f, 1.5f, 1.5f, 1.5f} - 0.5f * v * y * y);
 #elif defined(__ARM_NEON) && defined(__aarch64__)
-  return reinterpret_cast<Float4>(vsqrtq_f32(reinterpret_cast<float32x4_t>(v)));
+  const float32x4_t x = reinterpret_cast<float32x4_t>(v);
+  float32x4_t y = vrsqrteq_f32(x);
+  y = vmulq_f32(y, vrsqrtsq_f32(vmulq_f32(x, y), y));
+  y = vmulq_f32(y, vrsqrtsq_f32(vmulq_f32(x, y), y));
+  return reinterpret_cast<Float4>(y);
 #else
-  return Float4{std::sqrt(v[0]), std::sqrt(v[1]), std::sqrt(v[2]), std::sqrt(v[3])};
+  return Float4{1.0f / std::sqrt(v[0]), 1.0f / std::sqrt(v[1]), 1.0f / std::sqrt(v[2]),
+                1.0f / std::sqrt(v[3])};
 #endif
 }
 
