@@ -1,5 +1,6 @@
 #include "audio/dsp/radix4_fft.h"
 
+#include <algorithm>
 #include <bit>
 #include <cmath>
 #include <numbers>
@@ -94,11 +95,16 @@ inline __attribute__((always_inline)) void StageDestination(int ns, int size, co
 
 // Twiddles of every stage after the first, per group of `lanes` butterflies
 // and r = 1..3: exp(-2 pi i r k / (4 ns)) for lane l's k = (j + l) mod ns,
-// the real parts of the group, then the imaginary.
+// the real parts of the group, then the imaginary. They repeat every ns
+// butterflies, so only the groups with j < max(ns, lanes) are kept
+// (StageGroups of them per stage); group j reads TwiddleGroup's.
+int StageGroups(int ns, int lanes) { return std::max(ns / lanes, 1); }
+int TwiddleGroup(int j, int ns, int lanes) { return (j & (ns - 1)) / lanes; }  // ns: a power of four
+
 std::vector<float> StageTwiddles(int size, int lanes) {
   std::vector<float> twiddles;
   for (int ns = 4; ns < size; ns *= 4) {
-    for (int j = 0; j < size / 4; j += lanes) {
+    for (int j = 0; j < StageGroups(ns, lanes) * lanes; j += lanes) {
       for (int r = 1; r <= 3; ++r) {
         for (int part = 0; part < 2; ++part) {
           for (int lane = 0; lane < lanes; ++lane) {
@@ -146,13 +152,14 @@ SORVEL_MULTIVERSION void Transform(int size, const float* w, const float* re, co
   const float* src_im = dst_im;
   for (int ns = 4; ns < size; ns *= 4) {
     StageDestination(ns, size, src_re, out_re, out_im, a_re, a_im, b_re, b_im, &dst_re, &dst_im);
-    for (int j = 0; j < quarter; j += 4, w += 24) {
+    for (int j = 0; j < quarter; j += 4) {
+      const float* wj = w + TwiddleGroup(j, ns, 4) * 24;
       Complex4 a0 = Load(src_re, src_im, j);
-      Complex4 a1 = Multiply(Load(src_re, src_im, j + quarter), w);
-      Complex4 a2 = Multiply(Load(src_re, src_im, j + 2 * quarter), w + 8);
-      Complex4 a3 = Multiply(Load(src_re, src_im, j + 3 * quarter), w + 16);
+      Complex4 a1 = Multiply(Load(src_re, src_im, j + quarter), wj);
+      Complex4 a2 = Multiply(Load(src_re, src_im, j + 2 * quarter), wj + 8);
+      Complex4 a3 = Multiply(Load(src_re, src_im, j + 3 * quarter), wj + 16);
       Butterfly(a0, a1, a2, a3);
-      const int k = j % ns;
+      const int k = j & (ns - 1);  // j mod ns
       const int base = (j - k) * 4 + k;
       if (powers != nullptr && ns * 4 == size) {
         const Float4 scale = Splat4(power_scale);
@@ -167,6 +174,7 @@ SORVEL_MULTIVERSION void Transform(int size, const float* w, const float* re, co
       Store(dst_re, dst_im, base + 2 * ns, a2);
       Store(dst_re, dst_im, base + 3 * ns, a3);
     }
+    w += StageGroups(ns, 4) * 24;
     src_re = dst_re;
     src_im = dst_im;
   }
@@ -255,21 +263,22 @@ SORVEL_WIDE void TransformWide(int size, const float* w, const float* re, const 
   const float* src_im = dst_im;
   for (int ns = 4; ns < size; ns *= 4) {
     StageDestination(ns, size, src_re, out_re, out_im, a_re, a_im, b_re, b_im, &dst_re, &dst_im);
-    for (int j = 0; j < quarter; j += 8, w += 48) {
+    for (int j = 0; j < quarter; j += 8) {
+      const float* wj = w + TwiddleGroup(j, ns, 8) * 48;
       ComplexWide a0 = SORVEL_LOAD_COMPLEX(src_re, src_im, j);
       ComplexWide a1 = SORVEL_LOAD_COMPLEX(src_re, src_im, j + quarter);
       ComplexWide a2 = SORVEL_LOAD_COMPLEX(src_re, src_im, j + 2 * quarter);
       ComplexWide a3 = SORVEL_LOAD_COMPLEX(src_re, src_im, j + 3 * quarter);
-      MultiplyWide(a1, w);
-      MultiplyWide(a2, w + 16);
-      MultiplyWide(a3, w + 32);
+      MultiplyWide(a1, wj);
+      MultiplyWide(a2, wj + 16);
+      MultiplyWide(a3, wj + 32);
       Butterfly(a0, a1, a2, a3);
       if (ns == 4) {  // lanes 0-3 go to 4 j + r ns + l, lanes 4-7 16 further
         StoreHalves(dst_re, 4 * j, a0.re, a1.re, a2.re, a3.re);
         StoreHalves(dst_im, 4 * j, a0.im, a1.im, a2.im, a3.im);
         continue;
       }
-      const int k = j % ns;
+      const int k = j & (ns - 1);  // j mod ns
       const int base = (j - k) * 4 + k;
       if (powers != nullptr && ns * 4 == size) {  // the last stage, from size 64: ns >= 16
         const Wide scale = {power_scale, power_scale, power_scale, power_scale,
@@ -286,6 +295,7 @@ SORVEL_WIDE void TransformWide(int size, const float* w, const float* re, const 
         SORVEL_STORE_WIDE(dst_im + base + r * ns, a.im);
       }
     }
+    w += StageGroups(ns, 8) * 48;
     src_re = dst_re;
     src_im = dst_im;
   }
@@ -303,8 +313,7 @@ Radix4Fft::Radix4Fft(int size) : size_(size) {
   // j multiplies its inputs r = 1..3 by exp(-2 pi i r k / (4 ns)),
   // k = j mod ns; grouped by four lanes, and by eight for the wide path.
   // Only the table of the path in use is built (a second one is made if a
-  // caller switches paths): at the lengths of a lag profile each is tens of
-  // kilobytes.
+  // caller switches paths).
   wide_ = size >= 64 && HasWidePaths();
   if (wide_) {
     wide_twiddles_ = StageTwiddles(size, 8);

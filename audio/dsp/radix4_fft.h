@@ -53,9 +53,10 @@ class Radix4Fft {
            float* out_im, float power_scale, float* powers);
 
   int size_;
-  // Per stage after the first, per group of four butterflies: the twiddles
-  // w^1, w^2, w^3, real and imaginary, four lanes each; built when the
-  // four-lane path is used.
+  // Per stage after the first, per group of four butterflies (the groups
+  // of one sub-transform length ns; they repeat along the stage): the
+  // twiddles w^1, w^2, w^3, real and imaginary, four lanes each; built when
+  // the four-lane path is used.
   std::vector<float> twiddles_;
   std::vector<float> wide_twiddles_;  // the same per group of eight, for the wide path
   bool wide_ = false;
